@@ -13,10 +13,10 @@ struct ANEntryTable;
 // One cached character map of position mapping: for every character of `chunk`, the
 // index of the item holding it, in a movable global-memory block.
 struct ANCharMap {
-    uint16_t chunk;  // AN_NONE when the record is empty
-    void *block;     // HGLOBAL of u32 item indices, or null
-    uint32_t length; // characters recorded in block
-    uint32_t base;   // ordinal of the chunk's first character
+    uint16_t chunk;   // AN_NONE when the record is empty
+    void *block;      // HGLOBAL of u32 item indices, or null
+    uint32_t length;  // characters recorded in block
+    uint32_t base;    // ordinal of the chunk's first character
 };
 
 constexpr uint16_t ANMAP_NO_CHUNK = 0xFFFF;
@@ -24,19 +24,19 @@ constexpr uint16_t ANMAP_NO_CHUNK = 0xFFFF;
 // The annotation state of a document, kept in slot 151 of its module data.
 struct ANInstance {
     CHHandle chunker;
-    ANEntryTable *entries;      // null until the first insertion
-    ANStyleTable *styles;       // per-document styles; null if it could not be made
-    ANStyleTable *globalStyles; // the caller's, bound at ANInit
-    uint16_t hoverEntry;        // slot of the last move event, AN_NONE for none
-    ANPos hoverPos;             // position of the last move event
+    ANEntryTable *entries;       // null until the first insertion
+    ANStyleTable *styles;        // per-document styles; null if it could not be made
+    ANStyleTable *globalStyles;  // the caller's, bound at ANInit
+    uint16_t hoverEntry;         // slot of the last move event, AN_NONE for none
+    ANPos hoverPos;              // position of the last move event
     ANCallback callback;
     void *callbackData;
-    uint32_t buildCursor;       // next document range ANBuildAnnos examines
-    uint32_t charSet;           // character set content is read in
-    ANCharMap mapCache[2];      // most recently used first
-    DAHandle contentDoc;        // second document opened for content reading
-    CAHandle content;           // content handle on contentDoc
-    uint32_t contentFailed;     // bit 0: opening the content failed once
+    uint32_t buildCursor;    // next document range ANBuildAnnos examines
+    uint32_t charSet;        // character set content is read in
+    ANCharMap mapCache[2];   // most recently used first
+    DAHandle contentDoc;     // second document opened for content reading
+    CAHandle content;        // content handle on contentDoc
+    uint32_t contentFailed;  // bit 0: opening the content failed once
 };
 
 constexpr uint32_t ANCONTENT_FAILED = 0x1;

@@ -78,8 +78,7 @@ AN_MODULE_API uint32_t DAGetOption(DARetrievedDoc retrieved, uint32_t option, ui
                                    uint32_t *value);
 AN_MODULE_API uint32_t DAOpenDocument(DAHandle *newDoc, uint32_t kind, void *source,
                                       uint32_t flags);
-AN_MODULE_API uint32_t DASetOption(DAHandle doc, uint32_t option, const void *value,
-                                   uint32_t size);
+AN_MODULE_API uint32_t DASetOption(DAHandle doc, uint32_t option, const void *value, uint32_t size);
 AN_MODULE_API uint32_t DACloseDocument(DAHandle doc);
 AN_MODULE_API uint32_t UTGetOSCharSet(void);
 
@@ -108,13 +107,14 @@ AN_MODULE_API uint32_t CACloseContent(CAHandle content);
 
 /* Ids, classes and values of the module protocol that the library relies on. */
 #ifdef __cplusplus
-constexpr uint32_t ANMOD_SLOT_ANNO = 151;        /* module-data slot of the annotation state */
-constexpr uint32_t ANMOD_SLOT_COUNT = 152;       /* module-data slots at least present */
-constexpr uint32_t ANMOD_OPTION_CHARSET = 338482; /* DAGetOption: bit 0x10 picks ANMOD_CHARSET_WIDE */
+constexpr uint32_t ANMOD_SLOT_ANNO = 151;  /* module-data slot of the annotation state */
+constexpr uint32_t ANMOD_SLOT_COUNT = 152; /* module-data slots at least present */
+constexpr uint32_t ANMOD_OPTION_CHARSET =
+    338482; /* DAGetOption: bit 0x10 picks ANMOD_CHARSET_WIDE */
 constexpr uint32_t ANMOD_OPTION_CHARSET_BIT = 0x10;
 constexpr uint32_t ANMOD_CHARSET_WIDE = 0x14B00000; /* two bytes per character */
-constexpr uint32_t ANMOD_OPEN_FROM_CHUNKER = 18;  /* DAOpenDocument kind */
-constexpr uint32_t ANMOD_SETOPT_CHARSET = 1;      /* DASetOption id */
+constexpr uint32_t ANMOD_OPEN_FROM_CHUNKER = 18;    /* DAOpenDocument kind */
+constexpr uint32_t ANMOD_SETOPT_CHARSET = 1;        /* DASetOption id */
 constexpr uint32_t ANMOD_CLASS_ITEM = 0;
 constexpr uint32_t ANMOD_CLASS_SECTION = 1;
 constexpr uint32_t ANMOD_CLASS_CHAR = 2;
@@ -129,8 +129,8 @@ constexpr uint32_t ANMOD_READ_TEXT = 1;
 constexpr uint32_t ANMOD_READ_SPAN_START = 2;
 constexpr uint32_t ANMOD_READ_SPAN_END = 3;
 constexpr uint32_t ANMOD_READ_END = 5;
-constexpr uint32_t ANMOD_READ_NOT_TAKEN = 0x10000;  /* type 1: text not taken */
-constexpr uint32_t ANMOD_SPAN_HIDDEN_A = 0x10000;   /* spans whose text is not taken */
+constexpr uint32_t ANMOD_READ_NOT_TAKEN = 0x10000; /* type 1: text not taken */
+constexpr uint32_t ANMOD_SPAN_HIDDEN_A = 0x10000;  /* spans whose text is not taken */
 constexpr uint32_t ANMOD_SPAN_HIDDEN_B = 0x100000;
 constexpr uint32_t ANMOD_SPAN_HIDDEN_C = 0x120000;
 #endif

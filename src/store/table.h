@@ -18,8 +18,8 @@ constexpr uint16_t ANENTRY_OWNS_USERDATA = 0x1;  // userData is a heap block the
 struct ANEntry {
     uint16_t next;  // ordered list, or free list
     uint16_t prev;
-    uint16_t type;  // 1..7; meaningless in a free slot
-    uint16_t flags; // ANENTRY_*
+    uint16_t type;   // 1..7; meaningless in a free slot
+    uint16_t flags;  // ANENTRY_*
     ANAnnoRecord record;
 };
 static_assert(sizeof(ANEntry) == 104, "ANEntry is 104 bytes");
@@ -32,8 +32,8 @@ struct ANEntryTable {
     uint16_t last;
     uint16_t freeFirst;
     uint16_t freeLast;
-    uint32_t full;    // 1 once the capacity could not grow within 16 bits
-    uint32_t hasText; // 1 once a type-5 or type-6 entry was inserted
+    uint32_t full;     // 1 once the capacity could not grow within 16 bits
+    uint32_t hasText;  // 1 once a type-5 or type-6 entry was inserted
     uint32_t reserved;
     // followed by `capacity` ANEntry slots
 };

@@ -7,7 +7,7 @@
 #include "anno/anno.h"
 
 struct ANStyleTable {
-    ANHiliteStyle *styles; // null until the first add
+    ANHiliteStyle *styles;  // null until the first add
     uint16_t count;
     uint16_t capacity;
 };

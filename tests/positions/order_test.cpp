@@ -23,20 +23,20 @@ struct OrderCase {
 
 TEST(PositionOrder, NamedCasesSortAsDocumentedBothWays) {
     const OrderCase cases[] = {
-        {Pos(7, kNo), Pos(7, 0)},                  // the item before its characters
+        {Pos(7, kNo), Pos(7, 0)},  // the item before its characters
         {Pos(7, 0), Pos(7, 1)},
-        {Pos(7, kNo), Pos(7, 0xFFFFFFFE)},         // normalised 0 is smallest
-        {Pos(1, 0), Pos(0x80000000, 0)},           // itemId is unsigned
-        {TextPos(7, 3, 9), Pos(7, 3)},             // text before content at one anchor
+        {Pos(7, kNo), Pos(7, 0xFFFFFFFE)},  // normalised 0 is smallest
+        {Pos(1, 0), Pos(0x80000000, 0)},    // itemId is unsigned
+        {TextPos(7, 3, 9), Pos(7, 3)},      // text before content at one anchor
         {TextPos(7, 3, 1), TextPos(7, 3, 2)},
-        {TextPos(7, 0, 2), Pos(7, kNo)},           // text at (7,0) before the item itself
+        {TextPos(7, 0, 2), Pos(7, kNo)},  // text at (7,0) before the item itself
         {TextPos(7, kNo, 900), Pos(7, kNo)},
         {Pos(7, 5), TextPos(7, 6, 0)},
         {Pos(6, 0xFFFFFFFE), TextPos(7, kNo, 0)},
     };
     for (const OrderCase &c : cases) {
-        EXPECT_EQ(Cmp(c.before, c.after), -1) << ::testing::PrintToString(c.before) << " vs "
-                                              << ::testing::PrintToString(c.after);
+        EXPECT_EQ(Cmp(c.before, c.after), -1)
+            << ::testing::PrintToString(c.before) << " vs " << ::testing::PrintToString(c.after);
         EXPECT_EQ(Cmp(c.after, c.before), 1);
     }
 }
@@ -88,8 +88,8 @@ TEST(PositionOrder, AgreesWithTheKeyAndIsAntisymmetric) {
             const auto kb = Key(b);
             const int expected = ka < kb ? -1 : (kb < ka ? 1 : 0);
             const int got = Cmp(a, b);
-            ASSERT_EQ(got, expected) << ::testing::PrintToString(a) << " vs "
-                                     << ::testing::PrintToString(b);
+            ASSERT_EQ(got, expected)
+                << ::testing::PrintToString(a) << " vs " << ::testing::PrintToString(b);
             ASSERT_EQ(Cmp(b, a), -got);
         }
     }
@@ -104,9 +104,9 @@ TEST(PositionOrder, IsTransitiveOverRandomTriples) {
         const ANPos &b = all[pick(rng)];
         const ANPos &c = all[pick(rng)];
         if (Cmp(a, b) <= 0 && Cmp(b, c) <= 0) {
-            ASSERT_LE(Cmp(a, c), 0) << ::testing::PrintToString(a) << " "
-                                    << ::testing::PrintToString(b) << " "
-                                    << ::testing::PrintToString(c);
+            ASSERT_LE(Cmp(a, c), 0)
+                << ::testing::PrintToString(a) << " " << ::testing::PrintToString(b) << " "
+                << ::testing::PrintToString(c);
         }
     }
 }
