@@ -123,7 +123,7 @@ uint32_t ANReadPieces(ANInstance *instance, uint32_t *entries, uint32_t capacity
             if ((step & 1) != 0) ++oddPieces;
         }
     }
-    // Keeps the text that follows in the buffer on an even byte.
+    // The text is padded to an even byte count, within the buffer.
     if ((oddPieces & 1) != 0 && room != 0) *cursor = 0;
     return recorded;
 }
