@@ -382,13 +382,16 @@ TEST_F(ClearAnnosTest, TextAtCharacterZeroIsFoundPastAnnotationsOnItsItem) {
     }
 }
 
-TEST_F(ClearAnnosTest, EmptyTextLeftBySplittingAtTheEndKeepsTheLayout) {
-    // A placeholder put at the end of the last text splits it, leaving an empty
-    // text entry behind the placeholder.
+TEST_F(ClearAnnosTest, EmptyTextEntriesKeepTheLayout) {
+    // "abc", a placeholder, and an empty last text of the same tag: what splitting a
+    // text at its very end leaves.
     auto split = [](Doc &doc) {
         ASSERT_EQ(AddText(doc, kAnchor, u"abc", 1), AN_OK);
-        ASSERT_EQ(AddPlaceholder(doc, TextPos(1, kNo, 3), 2), AN_OK);
-        ASSERT_EQ(ListedEntries(doc).back().text, u"");
+        ASSERT_EQ(AddPlaceholder(doc, kAnchor, 2), AN_OK);
+        ASSERT_EQ(AddText(doc, kAnchor, u"d", 1), AN_OK);
+        ANEntryTable *table = MutableTable(doc);
+        ANSlot(table, table->last).record.textLength = 0;
+        ASSERT_TRUE(StoreHolds(doc));
     };
     {
         Doc doc(NewDoc());
