@@ -148,6 +148,7 @@ TEST_F(ClearAnnosTest, ReturnsTheLastCallbackResultAndZeroWhenNothingIsRemoved) 
         EXPECT_EQ(ANClearAnnos(doc, ANCLEAR_EQUAL, 3), c.expected);
         EXPECT_EQ(recorder.calls.size(), 2u) << "a callback result does not stop the walk";
         EXPECT_EQ(Tags(doc), std::vector<uint32_t>{4});
+        EXPECT_TRUE(StoreHolds(doc));
     }
 }
 
@@ -178,6 +179,7 @@ TEST_F(ClearAnnosTest, CallbackSeesTheRemovedEntryAlreadyOutOfTheTable) {
     EXPECT_EQ(call.record.style, 9u);
     EXPECT_TRUE(call.slotFree);
     EXPECT_EQ(call.countAtCall, 1);
+    EXPECT_TRUE(StoreHolds(doc));
 }
 
 TEST_F(ClearAnnosTest, RemovingTheHoveredEntryResetsTheHoverState) {
@@ -193,6 +195,7 @@ TEST_F(ClearAnnosTest, RemovingTheHoveredEntryResetsTheHoverState) {
     EXPECT_EQ(state->hoverEntry, AN_NONE);
     EXPECT_EQ(state->hoverPos.itemId, kNo);
     EXPECT_EQ(state->hoverPos.subItemId, kNo);
+    EXPECT_TRUE(StoreHolds(doc));
 }
 
 // ---- Annotation text ------------------------------------------------------------
@@ -609,6 +612,7 @@ TEST_F(ClearAnnosTest, JoinOutOfMemoryReportsThirteenAndLeavesTheTextsApart) {
         EXPECT_EQ(ANClearAnnos(doc, ANCLEAR_EQUAL, 2), 7u);
         anwin::clearFailures();
         EXPECT_EQ(ListedEntries(doc).size(), 3u);
+        EXPECT_TRUE(StoreHolds(doc));
     }
 #endif
 }
