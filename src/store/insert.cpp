@@ -154,7 +154,7 @@ bool MergeRange(ANEntryTable *table, uint16_t prev, uint16_t next, const ANAnnoR
 
 // The annotation text around the place of new text at its anchor.
 struct TextAround {
-    uint32_t before = 0;             // units of the text entries before the place
+    uint64_t before = 0;             // units of the text entries before the place
     uint64_t after = 0;              // units of the text entries after the place
     uint16_t mergeTarget = AN_NONE;  // the nearest text entry before, when it has type 5
     uint16_t following = AN_NONE;    // the type-5 entry next after, unless a placeholder is first
@@ -349,17 +349,18 @@ uint32_t InsertIntoTable(ANInstance *instance, uint16_t type, ANAnnoRecord *reco
         !TextIndexInside(table, around, record->start.textIndex)) {
         return AN_ERR_BADARG;
     }
-    if (static_cast<uint64_t>(around.before) + around.after + width > UINT32_MAX) {
+    if (around.before + around.after + width > UINT32_MAX) {
         return AN_ERR_NOMEM;  // the anchor's text would outgrow its 32-bit indices
     }
+    const auto before = static_cast<uint32_t>(around.before);
     table->hasText = 1;
-    if (mode == ANINSERT_ADD) ShiftTextPositions(table, type, record, around.before, width);
+    if (mode == ANINSERT_ADD) ShiftTextPositions(table, type, record, before, width);
 
     uint32_t rc = AN_OK;
     if (type == AN_TYPE_PLACEHOLDER) {
         if (mode == ANINSERT_ADD && around.following != AN_NONE &&
             record->start.textIndex > around.before + 1) {
-            rc = SplitText(instance, &prev, around.following, around.before, *record);
+            rc = SplitText(instance, &prev, around.following, before, *record);
         }
     } else {
         bool stored = false;
@@ -389,8 +390,7 @@ uint32_t ANInsertEntry(ANInstance *instance, uint16_t type, ANAnnoRecord *record
         record->textBuffer = nullptr;
     }
     if (type == AN_TYPE_TEXT && record->text == nullptr && record->textLength != 0) {
-        if (fromBuffer) record->text = savedText;
-        return AN_ERR_BADARG;
+        return AN_ERR_BADARG;  // (never with a buffer, which is not null)
     }
 
     uint32_t rc = AN_OK;
