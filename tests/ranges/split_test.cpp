@@ -2,6 +2,7 @@
 // past skipped items and covered positions, and the one-position case.
 #include <gtest/gtest.h>
 
+#include <cstring>
 #include <vector>
 
 #include "range_support.h"
@@ -80,6 +81,27 @@ TEST_F(SplitTest, GivenBackwardsTheRangeIsSplitTheSameWay) {
               (std::vector<Stored>{Range(1, 3), Mark(4), Range(5, 7), Mark(7)}));
     ASSERT_EQ(notes.calls.size(), 1u);
     EXPECT_EQ(notes.calls[0].record.start, Pos(1));
+}
+
+// Every descriptor form of type 3 goes through splitting: none reaches the table
+// as given.
+TEST_F(SplitTest, EveryDescriptorFormIsSplit) {
+    for (uint32_t size : {48u, 44u, 40u}) {
+        Doc doc(NewDoc(kExample));
+        unsigned char form[48] = {};
+        const uint32_t tag = 4;
+        const ANPos start = Pos(3), end = Pos(9);
+        std::memcpy(form, &size, 4);
+        std::memcpy(form + 4, &tag, 4);
+        std::memcpy(form + 8, &start, sizeof start);
+        std::memcpy(form + 24, &end, sizeof end);
+        ADD_OK(ANAddAnno(doc, AN_TYPE_RANGE, form));
+        EXPECT_EQ(StoredEntries(doc),
+                  (std::vector<Stored>{Mark(4), Range(5, 7), Mark(7), Range(8, 9)}))
+            << "form of " << size << " bytes";
+        EXPECT_EQ(notes.calls.size(), 1u);
+        notes.calls.clear();
+    }
 }
 
 TEST_F(SplitTest, EmptyRangeBecomesOneStepWithoutPiecesOrMarkers) {
