@@ -6,6 +6,7 @@
 
 #include "anno/toolkit.h"
 #include "binding/instance.h"
+#include "store/index.h"
 #include "store/table.h"
 
 namespace annobench {
@@ -187,6 +188,7 @@ TableMemory MeasureTable(DAHandle doc) {
     if (instance == nullptr || instance->entries == nullptr) return memory;
     const ANEntryTable *table = instance->entries;
     memory.table = ANTableBytes(table->capacity);
+    memory.index = ANIndexBytes(instance);
     memory.entries = table->count;
     for (uint16_t i = table->first; i != AN_NONE; i = ANSlot(table, i).next) {
         const ANEntry &entry = ANSlot(table, i);

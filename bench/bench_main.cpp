@@ -24,6 +24,9 @@ struct Result {
 // are repetitions) for the summary.
 class CollectingReporter : public benchmark::ConsoleReporter {
  public:
+    // Plain text: the output goes to logs and into the README.
+    CollectingReporter() : ConsoleReporter(OO_Tabular) {}
+
     void ReportRuns(const std::vector<Run> &runs) override {
         ConsoleReporter::ReportRuns(runs);
         for (const Run &run : runs) {

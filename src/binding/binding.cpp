@@ -4,6 +4,7 @@
 #include "binding/module_lock.h"
 #include "hosts/heap.h"
 #include "hosts/modules.h"
+#include "store/index.h"
 #include "store/table.h"
 #include "styles/styles.h"
 
@@ -34,6 +35,7 @@ void ANCloseContent(ANInstance *instance) {
 void ANFreeInstance(ANInstance *instance) {
     ANFreeTable(instance->entries);
     instance->entries = nullptr;
+    ANFreeIndex(instance);
     ANFreeCharMaps(instance);
     ANFreeStyleTable(instance->styles);
     instance->styles = nullptr;

@@ -9,6 +9,7 @@
 #include "hosts/modules.h"
 
 struct ANEntryTable;
+struct ANEntryIndex;
 
 // One cached character map of position mapping: for every character of `chunk`, the
 // index of the item holding it, in a movable global-memory block.
@@ -25,6 +26,7 @@ constexpr uint16_t ANMAP_NO_CHUNK = 0xFFFF;
 struct ANInstance {
     CHHandle chunker;
     ANEntryTable *entries;       // null until the first insertion
+    ANEntryIndex *index;         // lookup index of a large table (store/index.h), or null
     ANStyleTable *styles;        // per-document styles; null if it could not be made
     ANStyleTable *globalStyles;  // the caller's, bound at ANInit
     uint16_t hoverEntry;         // slot of the last move event, AN_NONE for none

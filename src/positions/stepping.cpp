@@ -4,6 +4,7 @@
 #include "binding/instance.h"
 #include "hosts/modules.h"
 #include "positions/order.h"
+#include "store/index.h"
 #include "store/table.h"
 
 namespace {
@@ -30,6 +31,53 @@ bool ANIsTextEntry(const ANEntry &entry) {
 
 uint32_t ANTextUnits(const ANEntry &entry) {
     return entry.type == AN_TYPE_TEXT ? entry.record.textLength : 1;
+}
+
+// Orders anchors as the position order does: by itemId, then by subItemId with
+// ANPOS_NOSUBITEM counted as 0. -1, 0 or 1.
+int ANCompareAnchorKey(const ANPos &a, const ANPos &b) {
+    if (a.itemId != b.itemId) return a.itemId < b.itemId ? -1 : 1;
+    const uint32_t sa = a.subItemId == ANPOS_NOSUBITEM ? 0 : a.subItemId;
+    const uint32_t sb = b.subItemId == ANPOS_NOSUBITEM ? 0 : b.subItemId;
+    if (sa != sb) return sa < sb ? -1 : 1;
+    return 0;
+}
+
+// The next annotation-text position after `p` through the index, with the result
+// of the walk along the list. The text entries whose anchor sorts before p's offer
+// nothing after p; those that share p's place in the order (its own anchor, and at
+// (i, 0xFFFFFFFF) and (i, 0) the other one) can only continue p's own text; the
+// first text entry past that place gives the next anchor.
+uint32_t ANIndexedNextTextPos(const ANEntryTable *table, const ANEntryIndex *index, const ANPos &p,
+                              ANPos *next) {
+    const uint16_t *text = ANIndexArraysOf(index).text;
+    uint32_t lo = 0;
+    uint32_t hi = index->texts;
+    while (lo < hi) {
+        const uint32_t mid = lo + (hi - lo) / 2;
+        if (ANCompareAnchorKey(ANSlot(table, text[mid]).record.start, p) < 0) {
+            lo = mid + 1;
+        } else {
+            hi = mid;
+        }
+    }
+    uint32_t k = lo;
+    uint32_t count = 0;
+    for (; k < index->texts; ++k) {
+        const ANEntry &entry = ANSlot(table, text[k]);
+        if (ANCompareAnchorKey(entry.record.start, p) != 0) break;
+        if (p.kind != ANPOS_ANNOTEXT || !ANSameAnchor(entry.record.start, p)) continue;
+        count += ANTextUnits(entry);
+        if (count >= 1 && p.textIndex < count - 1) {
+            *next = p;
+            next->textIndex++;
+            return AN_OK;
+        }
+    }
+    if (k == index->texts) return AN_ERR_NOTFOUND;
+    const ANPos &s = ANSlot(table, text[k]).record.start;
+    *next = ANPos{s.itemId, s.subItemId, ANPOS_ANNOTEXT, 0};
+    return AN_OK;
 }
 
 }  // namespace
@@ -100,6 +148,9 @@ extern "C" AN_API uint32_t ANNextAnnoTextPos(DAHandle doc, const ANPos *pos, ANP
     }
 
     const ANPos p = *pos;
+    if (const ANEntryIndex *index = ANCurrentIndex(instance)) {
+        return ANIndexedNextTextPos(table, index, p, next);
+    }
     const bool inText = p.kind == ANPOS_ANNOTEXT;
     uint32_t count = 0;
     for (uint16_t i = table->first; i != AN_NONE; i = ANSlot(table, i).next) {

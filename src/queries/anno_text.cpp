@@ -3,6 +3,7 @@
 #include "binding/instance.h"
 #include "positions/order.h"
 #include "queries/queries.h"
+#include "store/index.h"
 #include "store/table.h"
 #include "tracking/text_track.h"
 
@@ -30,10 +31,7 @@ uint32_t ANRebuildTextCache(const ANInstance *instance, ANAnnoTextTrack *track, 
 
     const ANEntryTable *table = instance->entries;
     if (table == nullptr) return AN_OK;
-    uint16_t i = table->first;
-    while (i != AN_NONE && !ANSameAnchor(ANSlot(table, i).record.start, pos)) {
-        i = ANSlot(table, i).next;
-    }
+    uint16_t i = ANFirstAtAnchor(instance, pos);
     bool first = true;
     for (; i != AN_NONE && ANSameAnchor(ANSlot(table, i).record.start, pos);
          i = ANSlot(table, i).next) {

@@ -1,6 +1,7 @@
 // Whether a position already lies in a range annotation, or on a cut marker.
 #include "positions/order.h"
 #include "ranges/split.h"
+#include "store/index.h"
 #include "store/table.h"
 
 namespace {
@@ -10,6 +11,15 @@ namespace {
 uint32_t ANPosCovered(const ANInstance *instance, const ANPos &pos, bool marks) {
     if (instance == nullptr || instance->entries == nullptr) return 0;
     const ANEntryTable *table = instance->entries;
+    if (const ANEntryIndex *index = ANCurrentIndex(instance)) {
+        // The walk would meet exactly the entries that start at or before `pos`; of
+        // those of the types asked for, the one that ends last decides.
+        const uint32_t met = ANIndexRanksAtOrBefore(table, index, pos);
+        if (met == 0) return 0;
+        const ANIndexArrays arrays = ANIndexArraysOf(index);
+        const uint16_t far = marks ? arrays.farCover[met - 1] : arrays.farRange[met - 1];
+        return far != AN_NONE && ANPosBefore(pos, ANSlot(table, far).record.end) ? 1 : 0;
+    }
     for (uint16_t i = table->first; i != AN_NONE; i = ANSlot(table, i).next) {
         const ANEntry &entry = ANSlot(table, i);
         if (ANPosBefore(pos, entry.record.start)) return 0;

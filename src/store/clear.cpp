@@ -10,6 +10,7 @@
 #include "hosts/heap.h"
 #include "hosts/modules.h"
 #include "positions/order.h"
+#include "store/index.h"
 #include "store/store.h"
 #include "store/table.h"
 
@@ -50,6 +51,8 @@ bool ANIsSelected(uint32_t tag, uint16_t flags, uint32_t value) {
 // Gives back the slot of an unlinked entry; a move event can no longer refer to it.
 void ANGiveBack(ANClearWalk &walk, uint16_t index) {
     ANReleaseSlot(walk.table, index);
+    // Removals renumber, join and reorder entries anywhere up to the anchor.
+    ANIndexForget(walk.instance);
     if (walk.instance->hoverEntry == index) ANResetHover(walk.instance);
 }
 
@@ -290,6 +293,7 @@ extern "C" AN_API uint32_t ANClearAnnos(DAHandle doc, uint16_t flags, uint32_t v
     if (table->count == 0) {
         ANFreeTable(table);
         instance->entries = nullptr;
+        ANFreeIndex(instance);
     }
     return status;
 }

@@ -10,6 +10,7 @@
 #include <cstring>
 
 #include "hosts/heap.h"
+#include "store/index.h"
 #include "store/store.h"
 
 namespace {
@@ -87,6 +88,7 @@ uint32_t LinkNewEntry(ANInstance *instance, uint16_t prev, uint16_t type,
     entry.flags = flags;
     entry.record = record;
     ANListInsertAfter(table, slot, prev);
+    ANIndexChangedAfter(instance, prev);
     table->count++;
     if (linked != nullptr) *linked = slot;
     if (table->count + 1 == table->capacity) return ANGrowTable(&instance->entries);
@@ -109,6 +111,7 @@ uint32_t InsertFirst(ANInstance *instance, uint16_t type, ANAnnoRecord *record, 
     }
     table->hasText = IsText(type) ? 1 : 0;
     instance->entries = table;
+    ANIndexForget(instance);
     return LinkNewEntry(instance, AN_NONE, type, *record, flags, nullptr);
 }
 
@@ -122,13 +125,15 @@ uint32_t GrowBeforeInsert(ANInstance *instance) {
 
 // A range touching or overlapping the type-3 entry just before or after its
 // place extends that entry instead of being stored. True when merged.
-bool MergeRange(ANEntryTable *table, uint16_t prev, uint16_t next, const ANAnnoRecord &record) {
+bool MergeRange(ANInstance *instance, uint16_t prev, uint16_t next, const ANAnnoRecord &record) {
+    ANEntryTable *table = instance->entries;
     bool merged = false;
     auto within = [&record](const ANPos &pos) {
         return ANPosAtOrBefore(record.start, pos) && ANPosAtOrBefore(pos, record.end);
     };
     if (prev != AN_NONE && ANSlot(table, prev).type == AN_TYPE_RANGE) {
         ANAnnoRecord &p = ANSlot(table, prev).record;
+        if (within(p.start) || within(p.end)) ANIndexChanged(instance, prev);
         if (within(p.start)) {
             p.start = record.start;
             merged = true;
@@ -140,6 +145,7 @@ bool MergeRange(ANEntryTable *table, uint16_t prev, uint16_t next, const ANAnnoR
     }
     if (next != AN_NONE && ANSlot(table, next).type == AN_TYPE_RANGE) {
         ANAnnoRecord &n = ANSlot(table, next).record;
+        if (within(n.start) || within(n.end)) ANIndexChanged(instance, next);
         if (within(n.start)) {
             n.start = record.start;
             merged = true;
@@ -196,19 +202,49 @@ bool TextIndexInside(const ANEntryTable *table, const TextAround &around, uint32
     return k - around.before <= ANSlot(table, around.following).record.textLength;
 }
 
+// The first entry that shifting text positions at `anchor` can change: the entries
+// before it neither start at the anchor nor, being of a type with an extent, end
+// there or later. The head of the list without an index.
+uint16_t FirstShiftCandidate(const ANInstance *instance, const ANPos &anchor) {
+    const ANEntryTable *table = instance->entries;
+    const ANEntryIndex *index = ANCurrentIndex(instance);
+    if (index == nullptr) return table->first;
+    // The anchor's first unit of text sorts before every position at the anchor.
+    const ANPos low{anchor.itemId, anchor.subItemId, ANPOS_ANNOTEXT, 0};
+    uint32_t r = ANIndexRanksBefore(table, index, low);
+    const uint32_t reaching = ANIndexFirstReaching(table, index, low);
+    if (reaching < r) r = reaching;
+    return r < index->valid ? ANIndexArraysOf(index).order[r] : AN_NONE;
+}
+
+// The last entry that sorts before every position at `anchor`, found through the
+// index; AN_NONE without an index or when there is none.
+uint16_t LastBeforeAnchor(const ANInstance *instance, const ANPos &anchor) {
+    const ANEntryIndex *index = ANCurrentIndex(instance);
+    if (index == nullptr) return AN_NONE;
+    const ANPos low{anchor.itemId, anchor.subItemId, ANPOS_ANNOTEXT, 0};
+    const uint32_t r = ANIndexRanksBefore(instance->entries, index, low);
+    return r == 0 ? AN_NONE : ANIndexArraysOf(index).order[r - 1];
+}
+
 // Moves the text positions of the entries around new text of `width` units
 // that goes in at record.start (b = units already before it at the anchor), and
 // the record's own text positions.
-void ShiftTextPositions(ANEntryTable *table, uint16_t type, ANAnnoRecord *record, uint32_t b,
+void ShiftTextPositions(ANInstance *instance, uint16_t type, ANAnnoRecord *record, uint32_t b,
                         uint32_t width) {
+    ANEntryTable *table = instance->entries;
     const ANPos anchor = record->start;
     const bool inText = anchor.kind == ANPOS_ANNOTEXT;
     const uint32_t k = anchor.textIndex;
-    for (uint16_t i = table->first; i != AN_NONE; i = ANSlot(table, i).next) {
+    const uint16_t from = FirstShiftCandidate(instance, anchor);
+    bool changed = false;
+    for (uint16_t i = from; i != AN_NONE; i = ANSlot(table, i).next) {
         ANEntry &entry = ANSlot(table, i);
         ANPos &start = entry.record.start;
         ANPos &end = entry.record.end;
         if (ANStartPastAnchor(start, anchor)) break;
+        const ANPos startWas = start;
+        const ANPos endWas = end;
         if (inText) {
             if (start.kind == ANPOS_ANNOTEXT && ANSameAnchor(start, anchor) &&
                 start.textIndex >= k) {
@@ -244,6 +280,11 @@ void ShiftTextPositions(ANEntryTable *table, uint16_t type, ANAnnoRecord *record
                 start.textIndex = b;
                 end = ANStepAfter(start);
             }
+        }
+        if (!changed && (std::memcmp(&startWas, &start, sizeof(ANPos)) != 0 ||
+                         std::memcmp(&endWas, &end, sizeof(ANPos)) != 0)) {
+            ANIndexChanged(instance, i);
+            changed = true;
         }
     }
     if (record->start.kind == ANPOS_ANNOTEXT) record->start.textIndex += width;
@@ -339,7 +380,7 @@ uint32_t InsertIntoTable(ANInstance *instance, uint16_t type, ANAnnoRecord *reco
     }
     uint16_t next = prev == AN_NONE ? table->first : ANSlot(table, prev).next;
 
-    if (type == AN_TYPE_RANGE && MergeRange(table, prev, next, *record)) return AN_OK;
+    if (type == AN_TYPE_RANGE && MergeRange(instance, prev, next, *record)) return AN_OK;
     if (!IsText(type)) return LinkNewEntry(instance, prev, type, *record, flags, nullptr);
 
     // Annotation text goes before the other annotations that start where it does.
@@ -359,7 +400,7 @@ uint32_t InsertIntoTable(ANInstance *instance, uint16_t type, ANAnnoRecord *reco
     }
     const auto before = static_cast<uint32_t>(around.before);
     table->hasText = 1;
-    if (mode == ANINSERT_ADD) ShiftTextPositions(table, type, record, before, width);
+    if (mode == ANINSERT_ADD) ShiftTextPositions(instance, type, record, before, width);
 
     uint32_t rc = AN_OK;
     if (type == AN_TYPE_PLACEHOLDER) {
@@ -407,11 +448,17 @@ uint32_t ANInsertEntry(ANInstance *instance, uint16_t type, ANAnnoRecord *record
         }
     } else {
         const ANPos anchor = record->start;
+        const bool shifts = mode == ANINSERT_ADD && IsText(type);
+        // Entries up to this one sort before the anchor and are neither shifted nor moved.
+        const uint16_t inOrder = shifts ? LastBeforeAnchor(instance, anchor) : AN_NONE;
         rc = InsertIntoTable(instance, type, record, mode, entryFlags);
         // Shifting text positions can leave entries behind ones they now sort before
         // (a point moved into new text, a range moved past a point at the same
         // index, the new entry itself): put the list back in document order.
-        if (mode == ANINSERT_ADD && IsText(type)) ANRestoreOrder(instance->entries, anchor);
+        if (shifts) {
+            ANRestoreOrder(instance->entries, anchor, inOrder);
+            ANIndexChangedAfter(instance, inOrder);
+        }
     }
 
     if (fromBuffer) {

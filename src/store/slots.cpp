@@ -119,9 +119,9 @@ void ANListRemove(ANEntryTable *table, uint16_t slot) {
     }
 }
 
-void ANRestoreOrder(ANEntryTable *table, const ANPos &anchor) {
+void ANRestoreOrder(ANEntryTable *table, const ANPos &anchor, uint16_t from) {
     if (table == nullptr || table->first == AN_NONE) return;
-    uint16_t current = ANSlot(table, table->first).next;
+    uint16_t current = ANSlot(table, from == AN_NONE ? table->first : from).next;
     while (current != AN_NONE) {
         const ANEntry &entry = ANSlot(table, current);
         if (ANStartPastAnchor(entry.record.start, anchor)) break;

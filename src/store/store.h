@@ -96,7 +96,9 @@ inline bool ANStartPastAnchor(const ANPos &start, const ANPos &anchor) {
 // Restores document order of `start` in the ordered list with one stable insertion
 // pass over the entries up to `anchor` (an entry that sorts before the one listed
 // ahead of it moves back to just after the nearest earlier entry that sorts at or
-// before it). Entries in order never move, so ties keep their order.
-void ANRestoreOrder(ANEntryTable *table, const ANPos &anchor);
+// before it). Entries in order never move, so ties keep their order. The pass begins
+// behind `from` when the caller knows that entry and all before it are in order and
+// sort before every entry that may have moved (AN_NONE: at the head).
+void ANRestoreOrder(ANEntryTable *table, const ANPos &anchor, uint16_t from = AN_NONE);
 
 #endif  // ANNO_STORE_STORE_H
