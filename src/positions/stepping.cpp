@@ -48,19 +48,29 @@ int ANCompareAnchorKey(const ANPos &a, const ANPos &b) {
 // nothing after p; those that share p's place in the order (its own anchor, and at
 // (i, 0xFFFFFFFF) and (i, 0) the other one) can only continue p's own text; the
 // first text entry past that place gives the next anchor.
-uint32_t ANIndexedNextTextPos(const ANEntryTable *table, const ANEntryIndex *index, const ANPos &p,
+uint32_t ANIndexedNextTextPos(const ANEntryTable *table, ANEntryIndex *index, const ANPos &p,
                               ANPos *next) {
     const uint16_t *text = ANIndexArraysOf(index).text;
+    auto keyBelow = [&](uint32_t k) {
+        return ANCompareAnchorKey(ANSlot(table, text[k]).record.start, p) < 0;
+    };
+    // A walk asks about positions in order: the place of the previous question is
+    // usually the place of this one.
+    const uint32_t hint = index->textHint;
     uint32_t lo = 0;
     uint32_t hi = index->texts;
+    if (hint <= hi && (hint == 0 || keyBelow(hint - 1)) && (hint == hi || !keyBelow(hint))) {
+        lo = hi = hint;
+    }
     while (lo < hi) {
         const uint32_t mid = lo + (hi - lo) / 2;
-        if (ANCompareAnchorKey(ANSlot(table, text[mid]).record.start, p) < 0) {
+        if (keyBelow(mid)) {
             lo = mid + 1;
         } else {
             hi = mid;
         }
     }
+    index->textHint = lo;
     uint32_t k = lo;
     uint32_t count = 0;
     for (; k < index->texts; ++k) {
@@ -148,7 +158,7 @@ extern "C" AN_API uint32_t ANNextAnnoTextPos(DAHandle doc, const ANPos *pos, ANP
     }
 
     const ANPos p = *pos;
-    if (const ANEntryIndex *index = ANCurrentIndex(instance)) {
+    if (ANEntryIndex *index = ANCurrentIndex(instance)) {
         return ANIndexedNextTextPos(table, index, p, next);
     }
     const bool inText = p.kind == ANPOS_ANNOTEXT;

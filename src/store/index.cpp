@@ -6,6 +6,7 @@
 
 #include "hosts/heap.h"
 #include "positions/order.h"
+#include "tracking/list_step.h"
 
 namespace {
 
@@ -58,7 +59,7 @@ ANEntryIndex *Resized(ANEntryIndex *old, uint32_t capacity) {
     index->capacity = capacity;
     index->valid = 0;
     index->texts = 0;
-    index->reserved = 0;
+    index->textHint = 0;
     if (old != nullptr) {
         const ANIndexArrays from = ANIndexArraysOf(old);
         const ANIndexArrays to = ANIndexArraysOf(index);
@@ -66,7 +67,7 @@ ANEntryIndex *Resized(ANEntryIndex *old, uint32_t capacity) {
         std::memcpy(to.order, from.order, ranks);
         std::memcpy(to.rank, from.rank, sizeof(uint16_t) * old->capacity);
         std::memcpy(to.text, from.text, sizeof(uint16_t) * old->texts);
-        std::memcpy(to.farExtent, from.farExtent, ranks);
+        std::memcpy(to.farAll, from.farAll, ranks);
         std::memcpy(to.farCover, from.farCover, ranks);
         std::memcpy(to.farRange, from.farRange, ranks);
         index->valid = old->valid;
@@ -90,9 +91,8 @@ bool CatchUp(const ANEntryTable *table, ANEntryIndex *index) {
         if (IsText(entry.type)) a.text[index->texts++] = slot;
         const bool range = entry.type == AN_TYPE_RANGE;
         const bool cover = range || entry.type == AN_TYPE_CUTMARK;
-        const bool extent = cover || entry.type == AN_TYPE_HILITE;
         const uint16_t none = AN_NONE;
-        a.farExtent[r] = Farther(table, r == 0 ? none : a.farExtent[r - 1], extent ? slot : none);
+        a.farAll[r] = Farther(table, r == 0 ? none : a.farAll[r - 1], slot);
         a.farCover[r] = Farther(table, r == 0 ? none : a.farCover[r - 1], cover ? slot : none);
         a.farRange[r] = Farther(table, r == 0 ? none : a.farRange[r - 1], range ? slot : none);
         index->valid = ++r;
@@ -109,7 +109,7 @@ ANIndexArrays ANIndexArraysOf(const ANEntryIndex *index) {
     return ANIndexArrays{base, base + n, base + 2 * n, base + 3 * n, base + 4 * n, base + 5 * n};
 }
 
-const ANEntryIndex *ANCurrentIndex(const ANInstance *constInstance) {
+ANEntryIndex *ANCurrentIndex(const ANInstance *constInstance) {
     if (constInstance == nullptr) return nullptr;
     // The index is the instance's cache; every instance is a heap record of its own.
     auto *instance = const_cast<ANInstance *>(constInstance);
@@ -202,7 +202,7 @@ uint32_t ANIndexRanksBefore(const ANEntryTable *table, const ANEntryIndex *index
 
 uint32_t ANIndexFirstReaching(const ANEntryTable *table, const ANEntryIndex *index,
                               const ANPos &pos) {
-    const uint16_t *far = ANIndexArraysOf(index).farExtent;
+    const uint16_t *far = ANIndexArraysOf(index).farAll;
     uint32_t lo = 0;
     uint32_t hi = index->valid;
     while (lo < hi) {
@@ -214,6 +214,18 @@ uint32_t ANIndexFirstReaching(const ANEntryTable *table, const ANEntryIndex *ind
         }
     }
     return lo;
+}
+
+uint16_t ANFirstEntryNotBefore(const ANInstance *instance, const ANPos &pos) {
+    const ANEntryTable *table = instance->entries;
+    if (table == nullptr) return AN_NONE;
+    const ANEntryIndex *index = ANCurrentIndex(instance);
+    if (index == nullptr) return ANNextEntryNotBefore(table, AN_NONE, pos);
+    // Before the first entry that starts after `pos`, the first one that reaches it.
+    uint32_t r = ANIndexRanksAtOrBefore(table, index, pos);
+    const uint32_t reaching = ANIndexFirstReaching(table, index, pos);
+    if (reaching < r) r = reaching;
+    return r < index->valid ? ANIndexArraysOf(index).order[r] : AN_NONE;
 }
 
 uint16_t ANFirstAtAnchor(const ANInstance *instance, const ANPos &pos) {

@@ -33,7 +33,7 @@ struct ANEntryIndex {
     uint32_t capacity;  // entries each array has room for (at least the table's capacity)
     uint32_t valid;     // list ranks [0, valid) are current
     uint32_t texts;     // text entries (types 5, 6) among those ranks
-    uint32_t reserved;
+    uint32_t textHint;  // where in text[] the last text step searched from (a guess)
 };
 static_assert(sizeof(ANEntryIndex) == 16, "ANEntryIndex header is 16 bytes");
 
@@ -48,15 +48,14 @@ inline size_t ANIndexBlockBytes(uint32_t capacity) {
 //   order[r]      the slot at rank r
 //   rank[s]       the rank of slot s (current for the slots at ranks below `valid`)
 //   text[k]       the slot of the k-th text entry, in list order
-//   farExtent[r]  of the entries of types 1, 3 and 7 at ranks 0..r, the one whose end
-//                 sorts last (AN_NONE when there is none)
+//   farAll[r]     of the entries at ranks 0..r, the one whose end sorts last
 //   farCover[r]   the same over types 3 and 7
 //   farRange[r]   the same over type 3
 struct ANIndexArrays {
     uint16_t *order;
     uint16_t *rank;
     uint16_t *text;
-    uint16_t *farExtent;
+    uint16_t *farAll;
     uint16_t *farCover;
     uint16_t *farRange;
 };
@@ -67,7 +66,7 @@ ANIndexArrays ANIndexArraysOf(const ANEntryIndex *index);
 // list). Allocates only through the process heap; a failed allocation frees the index
 // and changes nothing else. The instance is taken as const because the index is a
 // cache of its table: bringing it up to date changes no result of any operation.
-const ANEntryIndex *ANCurrentIndex(const ANInstance *instance);
+ANEntryIndex *ANCurrentIndex(const ANInstance *instance);
 
 // The ordered list changed right after `prev` (AN_NONE: at its front): a slot was
 // linked in there, or entries behind it moved.
@@ -92,10 +91,14 @@ uint32_t ANIndexRanksAtOrBefore(const ANEntryTable *table, const ANEntryIndex *i
                                 const ANPos &pos);
 // The number of entries whose start sorts before `pos`.
 uint32_t ANIndexRanksBefore(const ANEntryTable *table, const ANEntryIndex *index, const ANPos &pos);
-// The first rank from which on an entry of type 1, 3 or 7 ends at or after `pos`
-// (`valid` when none does).
+// The first rank whose entry ends at or after `pos` (`valid` when none does).
 uint32_t ANIndexFirstReaching(const ANEntryTable *table, const ANEntryIndex *index,
                               const ANPos &pos);
+
+// The first entry from the head of the list that is not wholly before `pos` (it
+// starts after `pos` or ends at or after it), as ANNextEntryNotBefore finds it from
+// the head; AN_NONE when there is none. Searched through the index, or walked.
+uint16_t ANFirstEntryNotBefore(const ANInstance *instance, const ANPos &pos);
 
 // The first entry in list order whose start has the same plain anchor as `pos`
 // (itemId and subItemId equal), or AN_NONE; searched through the index, or walked

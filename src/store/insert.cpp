@@ -203,8 +203,8 @@ bool TextIndexInside(const ANEntryTable *table, const TextAround &around, uint32
 }
 
 // The first entry that shifting text positions at `anchor` can change: the entries
-// before it neither start at the anchor nor, being of a type with an extent, end
-// there or later. The head of the list without an index.
+// before it neither start at the anchor nor end there or later. The head of the list
+// without an index.
 uint16_t FirstShiftCandidate(const ANInstance *instance, const ANPos &anchor) {
     const ANEntryTable *table = instance->entries;
     const ANEntryIndex *index = ANCurrentIndex(instance);

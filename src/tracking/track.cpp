@@ -5,6 +5,7 @@
 #include "anno/anno.h"
 #include "binding/instance.h"
 #include "positions/order.h"
+#include "store/index.h"
 #include "store/table.h"
 #include "styles/resolve.h"
 #include "tracking/list_step.h"
@@ -116,7 +117,8 @@ extern "C" AN_API uint32_t ANStartAnnoTrack(DAHandle doc, const ANPos *start, AN
 
     track->cursor = AN_NONE;
     track->hiliteEntry = AN_NONE;
-    const uint16_t first = ANNextEntryNotBefore(table, AN_NONE, *start);
+    // Through the index of a large table rather than from the head of the list.
+    const uint16_t first = ANFirstEntryNotBefore(instance, *start);
     if (first == AN_NONE) {
         ANSetPastEnd(track->nextChange);
         return ANTRACK_NOMORE;
