@@ -292,10 +292,14 @@ AN_API uint32_t ANSetCallback(DAHandle doc, ANCallback callback, void *callbackD
  * The descriptor (and a type-5 text) is only read. Range annotations are fitted to
  * the document's items and cut into pieces with cut markers. On success the
  * callback hears notification 1 once, with the normalised record.
- * Returns 15 (bad type, null descriptor, size not accepted, null doc), a DAGetAnno
- * failure, 18 (no state), 13 (out of memory or the table is full: the entry may
- * nevertheless be stored; no notification), for type 3 a failure of fitting it (the
- * pieces stored before stay), otherwise 0. */
+ * A type-1, 3 or 5 annotation with a non-zero userData hands that block over:
+ * ANClearUserData may free it.
+ * Returns 15 (bad type, null descriptor, size not accepted, null doc, a type-5 text
+ * of non-zero length at a null pointer, or a type-5/6 position inside annotation
+ * text that its anchor does not have: nothing added), a DAGetAnno failure, 18 (no
+ * state), 13 (out of memory or the table is full: the entry may nevertheless be
+ * stored; no notification), for type 3 a failure of fitting it (the pieces stored
+ * before stay), otherwise 0. */
 AN_API uint32_t ANAddAnno(DAHandle doc, uint16_t type, const void *descriptor);
 
 /* Removes the annotations of `doc` that `flags` and `value` select and announces

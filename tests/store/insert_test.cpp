@@ -318,12 +318,4 @@ TEST_F(InsertTest, TextPositionsOutsideTheAnnotationTextAreRefused) {
     EXPECT_EQ(AnchorText(doc, Pos(2)), u"abcx#");
 }
 
-TEST_F(InsertTest, PointsAndRangesMayUseTextPositionsOfTheirOwn) {
-    Doc doc(NewDoc());
-    ADD_OK(AddPoint(doc, TextPos(7, 3, 9), 1));
-    ADD_OK(AddHilite(doc, TextPos(7, 3, 2), TextPos(7, 3, 4), 2));
-    EXPECT_EQ(TableOf(doc)->count, 2);
-    EXPECT_EQ(TableOf(doc)->hasText, 0u);
-}
-
 }  // namespace
