@@ -58,7 +58,7 @@ TEST_F(BuiltAndCopiedUserDataTest, ClearingUserDataAfterBuildingFreesOnlyTheCall
     ASSERT_EQ(ANBuildAnnos(doc), AN_OK);
     const std::vector<EntryView> before = Entries(doc);
     ASSERT_EQ(before.size(), 3u);
-    const int64_t blocks = HeapBlocks();
+    [[maybe_unused]] const int64_t blocks = HeapBlocks();
 
     EXPECT_EQ(ANClearUserData(doc), AN_OK);
 
@@ -86,7 +86,7 @@ TEST_F(BuiltAndCopiedUserDataTest, ClearingUserDataOfACopyLeavesTheSourcesBlocks
     ASSERT_EQ(ANCopyAnnos(dest, src), AN_OK);
     const std::vector<EntryView> copies = Entries(dest);
     ASSERT_EQ(copies.size(), 2u);
-    const int64_t blocks = HeapBlocks();
+    [[maybe_unused]] const int64_t blocks = HeapBlocks();
 
     EXPECT_EQ(ANClearUserData(dest), AN_OK);
 #if ANNO_HAVE_PLATFORM_CONTROLS
