@@ -4,17 +4,19 @@
 #include <vector>
 
 #include "copybuild/entries.h"
+#include "support/add_helpers.h"
 #include "support/fixture.h"
 #include "support/invariants.h"
 
 namespace {
 
 using annotest::Doc;
+using annotest::Listed;
+using annotest::ListedEntries;
+using annotest::Notifications;
 using annotest::Pos;
 using annotest::TableInvariantsHold;
 using antk::Fn;
-using copybuild::Entries;
-using copybuild::EntryView;
 using copybuild::StateOf;
 
 constexpr uint32_t kNo = ANPOS_NOSUBITEM;
@@ -23,21 +25,8 @@ constexpr uint32_t kMarkedEnd = 0x80020008;
 constexpr uint32_t kField = 0x84000010;
 constexpr uint32_t kPlain = 0x81000000;
 constexpr uint32_t kUncolored = 0x82000000;
-constexpr uint32_t kUnknown = 0x80000001;
 
 class BuildAnnosTest : public annotest::LeakCheckedTest {};
-
-struct Notice {
-    uint16_t code;
-    uint16_t detail;
-    ANAnnoRecord record;
-};
-
-uint32_t Record(uint16_t code, uint16_t detail, void *record, void *data) {
-    static_cast<std::vector<Notice> *>(data)->push_back(
-        Notice{code, detail, *static_cast<ANAnnoRecord *>(record)});
-    return 0;
-}
 
 // A range's items: its first item, one inside, its end item (type 68 with the code),
 // and the item that follows it.
@@ -55,29 +44,34 @@ Span AddSpan(antk::DocumentBuilder &b, uint32_t code) {
     return Span{first, after};
 }
 
-EntryView Built(uint32_t tag, Span s, uint32_t eventMask, uint32_t style) {
-    EntryView e;
+// The highlight a range is expected to become.
+Listed Built(uint32_t tag, Span s, uint32_t eventMask, uint32_t style) {
+    Listed e{};
     e.type = AN_TYPE_HILITE;
-    e.size = 72;
-    e.tag = tag;
-    e.start = Pos(s.first);
-    e.end = Pos(s.after);
-    e.eventMask = eventMask;
-    e.userData = s.first;
-    e.word64 = style;
+    e.record.size = 72;
+    e.record.tag = tag;
+    e.record.start = Pos(s.first);
+    e.record.end = Pos(s.after);
+    e.record.eventMask = eventMask;
+    e.record.userData = s.first;
+    e.record.style = style;
     return e;
 }
 
-void ExpectEntries(DAHandle doc, const std::vector<EntryView> &expected) {
-    const std::vector<EntryView> got = Entries(doc);
+void ExpectEntries(DAHandle doc, const std::vector<Listed> &expected) {
+    const std::vector<Listed> got = ListedEntries(doc);
     ASSERT_EQ(got.size(), expected.size());
     for (size_t i = 0; i < got.size(); ++i) {
-        EXPECT_TRUE(got[i].sameAnnotation(expected[i]))
-            << "entry " << i << ": " << ::testing::PrintToString(got[i]) << " expected "
-            << ::testing::PrintToString(expected[i]);
+        EXPECT_TRUE(copybuild::SameAnnotation(got[i], expected[i])) << "entry " << i;
         EXPECT_EQ(got[i].flags, 0) << "a built entry does not own its userData";
     }
     EXPECT_TRUE(TableInvariantsHold(doc));
+}
+
+std::vector<uint32_t> Tags(DAHandle doc) {
+    std::vector<uint32_t> tags;
+    for (const Listed &e : ListedEntries(doc)) tags.push_back(e.record.tag);
+    return tags;
 }
 
 TEST_F(BuildAnnosTest, EachBuiltRangeCodeGivesItsTagEventsAndStyleAndIsAnnounced) {
@@ -86,36 +80,34 @@ TEST_F(BuildAnnosTest, EachBuiltRangeCodeGivesItsTagEventsAndStyleAndIsAnnounced
     const Span link = AddSpan(b, kLink);
     const Span marked = AddSpan(b, kMarkedEnd);
     const Span field = AddSpan(b, kField);
-    AddSpan(b, kUnknown);
+    AddSpan(b, 0x80000001);  // not a code that is built
     const Span plain = AddSpan(b, kPlain);
     const Span uncolored = AddSpan(b, kUncolored);
     Doc doc(b.build());
-    std::vector<Notice> notices;
-    ASSERT_EQ(ANInit(doc, nullptr, Record, &notices), AN_OK);
+    Notifications notices;
+    ASSERT_EQ(ANInit(doc, nullptr, Notifications::Callback, &notices), AN_OK);
 
     ASSERT_EQ(ANBuildAnnos(doc), AN_OK);
 
-    EntryView markedEntry = Built(0x80100001, marked, 15, 0x40001004);
-    markedEntry.end = Pos(marked.after, kNo, marked.after, 0xFFFFFFFF);
-    const std::vector<EntryView> expected = {
+    Listed markedEntry = Built(0x80100001, marked, 15, 0x40001004);
+    markedEntry.record.end = Pos(marked.after, kNo, marked.after, 0xFFFFFFFF);
+    const std::vector<Listed> expected = {
         Built(0x80200000, link, 15, 0x40001002),
         markedEntry,
         Built(0x84000002, field, 15, 0x40001001),
-        // Range 3 has a code that is not built; the numbers go on counting it.
+        // Range 3 is passed over; the numbers go on counting it.
         Built(0x81000004, plain, 0, 0x40001000),
         Built(0x82000005, uncolored, 12, 0x30000000),
     };
     ExpectEntries(doc, expected);
     EXPECT_EQ(StateOf(doc)->buildCursor, 6u);
 
-    ASSERT_EQ(notices.size(), expected.size());
-    for (size_t i = 0; i < notices.size(); ++i) {
-        EXPECT_EQ(notices[i].code, ANNOTIFY_ADDED);
-        EXPECT_EQ(notices[i].detail, AN_TYPE_HILITE);
-        EXPECT_EQ(notices[i].record.tag, expected[i].tag);
-        EXPECT_EQ(notices[i].record.start, expected[i].start);
-        EXPECT_EQ(notices[i].record.end, expected[i].end);
-        EXPECT_EQ(notices[i].record.userData, expected[i].userData);
+    ASSERT_EQ(notices.calls.size(), expected.size());
+    for (size_t i = 0; i < expected.size(); ++i) {
+        EXPECT_EQ(notices.calls[i].code, ANNOTIFY_ADDED);
+        EXPECT_EQ(notices.calls[i].detail, AN_TYPE_HILITE);
+        EXPECT_TRUE(copybuild::SameAnnotation(
+            Listed{0, AN_TYPE_HILITE, 0, notices.calls[i].record, {}}, expected[i]));
     }
 }
 
@@ -137,12 +129,12 @@ TEST_F(BuildAnnosTest, MarkedEndNamesTheFollowingItemAndItsFirstCharacter) {
 
     ASSERT_EQ(ANBuildAnnos(doc), AN_OK);
 
-    const std::vector<EntryView> got = Entries(doc);
+    const std::vector<Listed> got = ListedEntries(doc);
     ASSERT_EQ(got.size(), 2u);
-    EXPECT_EQ(got[0].start, Pos(first));
-    EXPECT_EQ(got[0].end, Pos(text, kNo, text, textFirstChar));
-    EXPECT_EQ(got[1].start, Pos(last));
-    EXPECT_EQ(got[1].end, Pos(antk::kNoNextItem, kNo, antk::kNoNextItem, 0xFFFFFFFF))
+    EXPECT_EQ(got[0].record.start, Pos(first));
+    EXPECT_EQ(got[0].record.end, Pos(text, kNo, text, textFirstChar));
+    EXPECT_EQ(got[1].record.start, Pos(last));
+    EXPECT_EQ(got[1].record.end, Pos(antk::kNoNextItem, kNo, antk::kNoNextItem, 0xFFFFFFFF))
         << "after the last item comes no item, and no text";
     EXPECT_TRUE(TableInvariantsHold(doc));
 }
@@ -174,20 +166,19 @@ TEST_F(BuildAnnosTest, RangesWithoutAnEndItemArePassedOverAndNeverRetried) {
     b.item(antk::kItemRangeEnd, kPlain);
     b.item(antk::kItemParagraph);
     Doc doc(b.build());
-    std::vector<Notice> notices;
-    ASSERT_EQ(ANInit(doc, nullptr, Record, &notices), AN_OK);
+    Notifications notices;
+    ASSERT_EQ(ANInit(doc, nullptr, Notifications::Callback, &notices), AN_OK);
 
     ASSERT_EQ(ANBuildAnnos(doc), AN_OK);
     ExpectEntries(doc, {Built(0x80200000, link, 15, 0x40001002)});
     EXPECT_EQ(StateOf(doc)->buildCursor, 2u);
-    EXPECT_EQ(notices.size(), 1u);
 
     antk::resetCalls();
     ASSERT_EQ(ANBuildAnnos(doc), AN_OK);
     EXPECT_EQ(antk::calls(Fn::CHGetItemId), 0u);
     EXPECT_EQ(antk::calls(Fn::CHGetItem), 0u);
-    EXPECT_EQ(notices.size(), 1u);
-    EXPECT_EQ(Entries(doc).size(), 1u);
+    EXPECT_EQ(notices.calls.size(), 1u);
+    EXPECT_EQ(ListedEntries(doc).size(), 1u);
 }
 
 TEST_F(BuildAnnosTest, ALaterCallExaminesOnlyTheRangesAfterTheCursor) {
@@ -195,8 +186,8 @@ TEST_F(BuildAnnosTest, ALaterCallExaminesOnlyTheRangesAfterTheCursor) {
     std::vector<Span> spans;
     for (uint32_t code : {kLink, kField, kPlain, kUncolored}) spans.push_back(AddSpan(b, code));
     Doc doc(b.build());
-    std::vector<Notice> notices;
-    ASSERT_EQ(ANInit(doc, nullptr, Record, &notices), AN_OK);
+    Notifications notices;
+    ASSERT_EQ(ANInit(doc, nullptr, Notifications::Callback, &notices), AN_OK);
     EXPECT_EQ(StateOf(doc)->buildCursor, 0u);
     // As if an earlier call had examined the first two ranges.
     StateOf(doc)->buildCursor = 2;
@@ -212,8 +203,8 @@ TEST_F(BuildAnnosTest, ALaterCallExaminesOnlyTheRangesAfterTheCursor) {
     ASSERT_EQ(ANBuildAnnos(doc), AN_OK);
     EXPECT_EQ(antk::calls(Fn::CHGetItemCount), 1u);
     EXPECT_EQ(antk::calls(Fn::CHGetItemId), 0u);
-    EXPECT_EQ(Entries(doc).size(), 2u) << "nothing is built twice";
-    EXPECT_EQ(notices.size(), 2u);
+    EXPECT_EQ(ListedEntries(doc).size(), 2u) << "nothing is built twice";
+    EXPECT_EQ(notices.calls.size(), 2u);
 }
 
 TEST_F(BuildAnnosTest, WithoutARangeCountNothingIsExaminedAndTheNextCallStartsOver) {
@@ -227,7 +218,7 @@ TEST_F(BuildAnnosTest, WithoutARangeCountNothingIsExaminedAndTheNextCallStartsOv
     EXPECT_EQ(ANBuildAnnos(doc), AN_OK);
     EXPECT_EQ(antk::calls(Fn::CHGetItemId), 0u);
     EXPECT_EQ(StateOf(doc)->buildCursor, 0u);
-    EXPECT_EQ(StateOf(doc)->entries, nullptr);
+    EXPECT_EQ(annotest::TableOf(doc), nullptr);
 
     EXPECT_EQ(ANBuildAnnos(doc), AN_OK);
     ExpectEntries(doc, {Built(0x80200000, link, 15, 0x40001002)});
@@ -247,7 +238,8 @@ TEST_F(BuildAnnosTest, BadHandleMissingStateAndLookupFailureExamineNothing) {
     EXPECT_EQ(StateOf(doc)->buildCursor, 0u);
 }
 
-// A document whose ranges each cost three or four chunker reads.
+// Three ranges of four chunker reads each: the range record and three items for the
+// first and last; the record, two items and the item after the end for the marked one.
 DAHandle ThreeRanges(std::vector<Span> *spans) {
     antk::DocumentBuilder b;
     spans->push_back(AddSpan(b, kLink));
@@ -260,12 +252,6 @@ DAHandle ThreeRanges(std::vector<Span> *spans) {
     return b.build();
 }
 
-std::vector<uint32_t> Tags(DAHandle doc) {
-    std::vector<uint32_t> tags;
-    for (const EntryView &e : Entries(doc)) tags.push_back(e.tag);
-    return tags;
-}
-
 TEST_F(BuildAnnosTest, AFailedRangeLookupPassesOverThatRangeOnly) {
     const std::vector<uint32_t> all = {0x80200000, 0x80100001, 0x81000002};
     for (uint64_t n = 1; n <= 3; ++n) {
@@ -275,29 +261,25 @@ TEST_F(BuildAnnosTest, AFailedRangeLookupPassesOverThatRangeOnly) {
         antk::failCall(Fn::CHGetItemId, n, 90);
         EXPECT_EQ(ANBuildAnnos(doc), AN_OK);
         std::vector<uint32_t> expected = all;
-        expected.erase(expected.begin() + static_cast<long>(n - 1));
+        expected.erase(expected.begin() + static_cast<std::ptrdiff_t>(n - 1));
         EXPECT_EQ(Tags(doc), expected) << "failing lookup " << n;
         EXPECT_EQ(StateOf(doc)->buildCursor, 3u);
     }
 }
 
 TEST_F(BuildAnnosTest, AFailedItemReadPassesOverItsRangeOrLeavesTheMarkedEndWithoutText) {
-    uint64_t reads = 0;
+    constexpr uint64_t kReads = 12;
+    std::vector<int> missing(3, 0);
+    int textLost = 0;
     {
         std::vector<Span> spans;
         Doc doc(ThreeRanges(&spans));
         ASSERT_EQ(ANInit(doc, nullptr, nullptr, nullptr), AN_OK);
         antk::resetCalls();
         ASSERT_EQ(ANBuildAnnos(doc), AN_OK);
-        reads = antk::calls(Fn::CHGetItem);
-        ASSERT_EQ(Entries(doc).size(), 3u);
+        ASSERT_EQ(antk::calls(Fn::CHGetItem), kReads);
     }
-    // Per range: its record, then its items up to the end item; the marked range
-    // reads the item after it once more.
-    ASSERT_EQ(reads, 4u + 4u + 4u);
-    std::vector<int> missing(3, 0);
-    int textLost = 0;
-    for (uint64_t n = 1; n <= reads; ++n) {
+    for (uint64_t n = 1; n <= kReads; ++n) {
         std::vector<Span> spans;
         Doc doc(ThreeRanges(&spans));
         ASSERT_EQ(ANInit(doc, nullptr, nullptr, nullptr), AN_OK);
@@ -305,16 +287,14 @@ TEST_F(BuildAnnosTest, AFailedItemReadPassesOverItsRangeOrLeavesTheMarkedEndWith
         EXPECT_EQ(ANBuildAnnos(doc), AN_OK);
         antk::clearFailures();
         EXPECT_EQ(StateOf(doc)->buildCursor, 3u);
-        const std::vector<EntryView> got = Entries(doc);
-        EXPECT_GE(got.size(), 2u) << "read " << n;
         std::vector<bool> seen(3, false);
-        for (const EntryView &e : got) {
-            const uint32_t index = e.tag & 0xFF;
+        for (const Listed &e : ListedEntries(doc)) {
+            const uint32_t index = e.record.tag & 0xFF;
             ASSERT_LT(index, 3u);
             seen[index] = true;
-            EXPECT_EQ(e.start, Pos(spans[index].first));
-            EXPECT_EQ(e.end.itemId, spans[index].after);
-            if (index == 1 && e.end.textIndex == 0xFFFFFFFF) ++textLost;
+            EXPECT_EQ(e.record.start, Pos(spans[index].first));
+            EXPECT_EQ(e.record.end.itemId, spans[index].after);
+            if (index == 1 && e.record.end.textIndex == 0xFFFFFFFF) ++textLost;
         }
         for (size_t i = 0; i < 3; ++i) missing[i] += seen[i] ? 0 : 1;
     }
@@ -352,28 +332,28 @@ TEST_F(BuildAnnosTest, OutOfMemoryAnywhereLosesOnlyWholeRangesAndLeaksNothing) {
         anwin::resetCounters();
         ASSERT_EQ(ANBuildAnnos(doc), AN_OK);
         needed = anwin::allocations();
-        ASSERT_EQ(Entries(doc).size(), 12u);
+        ASSERT_EQ(ListedEntries(doc).size(), 12u);
     }
     ASSERT_GE(needed, 2u) << "the table and its growth";
     for (uint64_t n = 1; n <= needed; ++n) {
         std::vector<Span> spans;
         Doc doc(make(&spans));
-        std::vector<Notice> notices;
-        ASSERT_EQ(ANInit(doc, nullptr, Record, &notices), AN_OK);
+        Notifications notices;
+        ASSERT_EQ(ANInit(doc, nullptr, Notifications::Callback, &notices), AN_OK);
         anwin::resetCounters();
         anwin::failAllocation(n);
         EXPECT_EQ(ANBuildAnnos(doc), AN_OK) << "allocation " << n;
         anwin::clearFailures();
         EXPECT_EQ(StateOf(doc)->buildCursor, 12u);
         EXPECT_TRUE(TableInvariantsHold(doc)) << "allocation " << n;
-        const std::vector<EntryView> got = Entries(doc);
+        const std::vector<Listed> got = ListedEntries(doc);
         EXPECT_GE(got.size(), 11u) << "allocation " << n;
-        EXPECT_LE(notices.size(), got.size());
-        for (const EntryView &e : got) {
-            const uint32_t index = e.tag & 0xFF;
+        EXPECT_LE(notices.calls.size(), got.size());
+        for (const Listed &e : got) {
+            const uint32_t index = e.record.tag & 0xFF;
             ASSERT_LT(index, 12u);
-            EXPECT_EQ(e.start, Pos(spans[index].first));
-            EXPECT_EQ(e.end.itemId, spans[index].after);
+            EXPECT_EQ(e.record.start, Pos(spans[index].first));
+            EXPECT_EQ(e.record.end.itemId, spans[index].after);
         }
     }
 #endif

@@ -1,74 +1,34 @@
 // Copying every annotation and per-document style of one document into another.
 #include <gtest/gtest.h>
 
-#include <cstring>
 #include <string>
 #include <vector>
 
 #include "copybuild/entries.h"
-#include "hosts/heap.h"
 #include "styles/styles.h"
+#include "support/add_helpers.h"
 #include "support/fixture.h"
 #include "support/invariants.h"
 
 namespace {
 
+using annotest::AddHilite;
+using annotest::AddPoint;
+using annotest::AddRange;
+using annotest::AddText;
 using annotest::Doc;
+using annotest::Listed;
+using annotest::ListedEntries;
+using annotest::Notifications;
 using annotest::PlainDocument;
 using annotest::Pos;
 using annotest::TableInvariantsHold;
 using antk::Fn;
-using copybuild::Entries;
-using copybuild::EntryView;
+using copybuild::SameAnnotation;
 using copybuild::StateOf;
 using copybuild::TableBytes;
-using copybuild::TextBuffers;
 
 class CopyAnnosTest : public annotest::LeakCheckedTest {};
-
-uint32_t CountCalls(uint16_t, uint16_t, void *, void *data) {
-    ++*static_cast<int *>(data);
-    return 0;
-}
-
-ANAnnoRecord Hilite(uint32_t tag, ANPos start, ANPos end, uint32_t style, uint64_t userData = 0) {
-    ANAnnoRecord r{};
-    r.size = AN_RECORD_SIZE_POINT;
-    r.tag = tag;
-    r.start = start;
-    r.end = end;
-    r.eventMask = 3;
-    r.userData = userData;
-    r.value = 42;
-    r.style = style;
-    return r;
-}
-
-ANAnnoRecord Point(uint32_t tag, ANPos at, uint64_t carried) {
-    ANAnnoRecord r{};
-    r.size = AN_RECORD_SIZE_POINT;
-    r.tag = tag;
-    r.start = at;
-    r.end = at;
-    r.eventMask = 1;
-    r.value = 7;
-    r.value64 = carried;
-    return r;
-}
-
-void AddText(DAHandle doc, uint32_t tag, ANPos at, const std::u16string &text) {
-    ANTextDesc d{};
-    d.size = sizeof d;
-    d.tag = tag;
-    d.pos = at;
-    d.text = reinterpret_cast<const uint16_t *>(text.data());
-    d.textLength = static_cast<uint32_t>(text.size());
-    ASSERT_EQ(ANAddAnno(doc, AN_TYPE_TEXT, &d), AN_OK);
-}
-
-void Add(DAHandle doc, uint16_t type, const ANAnnoRecord &r) {
-    ASSERT_EQ(ANAddAnno(doc, type, &r), AN_OK);
-}
 
 ANHiliteStyle Style(uint32_t id, uint32_t color1) {
     ANHiliteStyle s{};
@@ -76,23 +36,22 @@ ANHiliteStyle Style(uint32_t id, uint32_t color1) {
     s.styleId = id;
     s.flags = ANSTYLE_COLOR1;
     s.color1 = color1;
-    s.attr2 = 0xFFFF;
     return s;
 }
 
-// A source with a highlight, two points, a text and a style.
+// A highlight, two points, a text and a style.
 void FillSource(DAHandle doc) {
-    Add(doc, AN_TYPE_HILITE, Hilite(0x11, Pos(2), Pos(5), 0x40000007));
-    Add(doc, AN_TYPE_POINT, Point(0x22, Pos(4), 999));
-    Add(doc, AN_TYPE_VALUE, Point(0x44, Pos(1), 0));
-    AddText(doc, 0x55, Pos(6), u"abc");
+    ASSERT_EQ(AddHilite(doc, Pos(2), Pos(5), 0x11, 0x40000007, 0, 3, 42), AN_OK);
+    ASSERT_EQ(AddPoint(doc, Pos(4), 0x22, 9), AN_OK);
+    ASSERT_EQ(AddPoint(doc, Pos(1), 0x44, 8, AN_TYPE_VALUE), AN_OK);
+    ASSERT_EQ(AddText(doc, Pos(6), u"abc", 0x55), AN_OK);
     const ANHiliteStyle s = Style(7, 0x0000FF);
     ASSERT_EQ(ANAddHiliteStyle(doc, &s), AN_OK);
 }
 
-std::vector<uint32_t> Tags(const std::vector<EntryView> &entries) {
+std::vector<uint32_t> Tags(DAHandle doc) {
     std::vector<uint32_t> tags;
-    for (const EntryView &e : entries) tags.push_back(e.tag);
+    for (const Listed &e : ListedEntries(doc)) tags.push_back(e.record.tag);
     return tags;
 }
 
@@ -105,42 +64,37 @@ std::string StyleBytes(DAHandle doc) {
 TEST_F(CopyAnnosTest, EmptyDestinationReceivesEveryEntryInSourceOrderWithoutNotification) {
     Doc src(PlainDocument(10));
     Doc dest(PlainDocument(10));
-    int srcCalls = 0;
-    int destCalls = 0;
-    ASSERT_EQ(ANInit(src, nullptr, CountCalls, &srcCalls), AN_OK);
-    ASSERT_EQ(ANInit(dest, nullptr, CountCalls, &destCalls), AN_OK);
+    Notifications srcCalls;
+    Notifications destCalls;
+    ASSERT_EQ(ANInit(src, nullptr, Notifications::Callback, &srcCalls), AN_OK);
+    ASSERT_EQ(ANInit(dest, nullptr, Notifications::Callback, &destCalls), AN_OK);
     FillSource(src);
-    const std::vector<EntryView> before = Entries(src);
+    const std::vector<Listed> source = ListedEntries(src);
     const std::string srcBytes = TableBytes(src);
-    srcCalls = 0;
+    srcCalls.calls.clear();
 
     ASSERT_EQ(ANCopyAnnos(dest, src), AN_OK);
 
-    const std::vector<EntryView> copied = Entries(dest);
-    ASSERT_EQ(copied.size(), before.size());
+    const std::vector<Listed> copied = ListedEntries(dest);
+    ASSERT_EQ(copied.size(), source.size());
     for (size_t i = 0; i < copied.size(); ++i) {
-        EXPECT_TRUE(copied[i].sameAnnotation(before[i]))
-            << ::testing::PrintToString(copied[i]) << " vs " << ::testing::PrintToString(before[i]);
+        EXPECT_TRUE(SameAnnotation(copied[i], source[i]));
         EXPECT_EQ(copied[i].flags, 0) << "a copy never owns the source caller's userData";
+        if (copied[i].type == AN_TYPE_TEXT) {
+            EXPECT_EQ(copied[i].text, u"abc");
+            EXPECT_NE(copied[i].record.textBuffer, source[i].record.textBuffer);
+        }
     }
-    EXPECT_EQ(destCalls, 0);
-    EXPECT_EQ(srcCalls, 0);
+    EXPECT_TRUE(destCalls.calls.empty());
+    EXPECT_TRUE(srcCalls.calls.empty());
     EXPECT_EQ(TableBytes(src), srcBytes) << "the source stays byte for byte";
     EXPECT_TRUE(TableInvariantsHold(dest));
 
-    // The text lives in a buffer of the destination's own.
-    const std::vector<const uint16_t *> srcTexts = TextBuffers(src);
-    const std::vector<const uint16_t *> destTexts = TextBuffers(dest);
-    ASSERT_EQ(destTexts.size(), 1u);
-    ASSERT_EQ(srcTexts.size(), 1u);
-    EXPECT_NE(destTexts[0], srcTexts[0]);
-    EXPECT_EQ(StateOf(dest)->entries->hasText, 1u);
-
-    // Releasing the source leaves the copies intact.
+    // The copies hold nothing of the source's.
     ASSERT_EQ(ANDeInit(src), AN_OK);
-    const std::vector<EntryView> after = Entries(dest);
-    ASSERT_EQ(after.size(), before.size());
-    for (size_t i = 0; i < after.size(); ++i) EXPECT_TRUE(after[i].sameAnnotation(before[i]));
+    const std::vector<Listed> after = ListedEntries(dest);
+    ASSERT_EQ(after.size(), source.size());
+    for (size_t i = 0; i < after.size(); ++i) EXPECT_TRUE(SameAnnotation(after[i], source[i]));
 }
 
 TEST_F(CopyAnnosTest, CopiesMergeWithTheDestinationsOwnEntriesByPosition) {
@@ -148,19 +102,19 @@ TEST_F(CopyAnnosTest, CopiesMergeWithTheDestinationsOwnEntriesByPosition) {
     Doc dest(PlainDocument(10));
     ASSERT_EQ(ANInit(src, nullptr, nullptr, nullptr), AN_OK);
     ASSERT_EQ(ANInit(dest, nullptr, nullptr, nullptr), AN_OK);
-    Add(dest, AN_TYPE_HILITE, Hilite(0xD0, Pos(0), Pos(3), 1));
-    Add(dest, AN_TYPE_POINT, Point(0xD1, Pos(5), 0));
-    Add(src, AN_TYPE_HILITE, Hilite(0x52, Pos(7), Pos(9), 2));
-    Add(src, AN_TYPE_POINT, Point(0x51, Pos(4), 0));
-    Add(src, AN_TYPE_VALUE, Point(0x53, Pos(5), 0));
-    Add(src, AN_TYPE_HILITE, Hilite(0x50, Pos(0), Pos(1), 3));
+    ASSERT_EQ(AddHilite(dest, Pos(0), Pos(3), 0xD0), AN_OK);
+    ASSERT_EQ(AddPoint(dest, Pos(5), 0xD1), AN_OK);
+    ASSERT_EQ(AddHilite(src, Pos(7), Pos(9), 0x52), AN_OK);
+    ASSERT_EQ(AddPoint(src, Pos(4), 0x51), AN_OK);
+    ASSERT_EQ(AddPoint(src, Pos(5), 0x53, 0, AN_TYPE_VALUE), AN_OK);
+    ASSERT_EQ(AddHilite(src, Pos(0), Pos(1), 0x50), AN_OK);
 
     ASSERT_EQ(ANCopyAnnos(dest, src), AN_OK);
 
     // Equal starts keep the destination's entry first: the copy came later.
-    EXPECT_EQ(Tags(Entries(dest)), (std::vector<uint32_t>{0xD0, 0x50, 0x51, 0xD1, 0x53, 0x52}));
+    EXPECT_EQ(Tags(dest), (std::vector<uint32_t>{0xD0, 0x50, 0x51, 0xD1, 0x53, 0x52}));
     EXPECT_TRUE(TableInvariantsHold(dest));
-    EXPECT_EQ(Tags(Entries(src)), (std::vector<uint32_t>{0x50, 0x51, 0x53, 0x52}));
+    EXPECT_EQ(Tags(src), (std::vector<uint32_t>{0x50, 0x51, 0x53, 0x52}));
 }
 
 TEST_F(CopyAnnosTest, SourceStylesJoinTheDestinationsAndReplaceThoseWithTheSameId) {
@@ -168,7 +122,7 @@ TEST_F(CopyAnnosTest, SourceStylesJoinTheDestinationsAndReplaceThoseWithTheSameI
     Doc dest(PlainDocument(10));
     ASSERT_EQ(ANInit(src, nullptr, nullptr, nullptr), AN_OK);
     ASSERT_EQ(ANInit(dest, nullptr, nullptr, nullptr), AN_OK);
-    Add(src, AN_TYPE_HILITE, Hilite(1, Pos(1), Pos(2), 0x40000007));
+    ASSERT_EQ(AddHilite(src, Pos(1), Pos(2)), AN_OK);
     const ANHiliteStyle srcStyles[] = {Style(7, 0x0000FF), Style(8, 0x00FF00)};
     const ANHiliteStyle destStyles[] = {Style(7, 0xFF0000), Style(9, 0x123456)};
     for (const ANHiliteStyle &s : srcStyles) ASSERT_EQ(ANAddHiliteStyle(src, &s), AN_OK);
@@ -202,7 +156,7 @@ TEST_F(CopyAnnosTest, SourceWithoutEntriesCopiesNothingAndNeverLooksAtTheDestina
     antk::resetCalls();
     EXPECT_EQ(ANCopyAnnos(dest, src), AN_OK);
     EXPECT_EQ(antk::calls(Fn::DAGetAnno), 1u);
-    EXPECT_EQ(StateOf(dest)->entries, nullptr);
+    EXPECT_EQ(annotest::TableOf(dest), nullptr);
     EXPECT_EQ(ANGetHiliteStyle(dest, 7, nullptr), 0u) << "without entries not even styles";
 }
 
@@ -212,16 +166,15 @@ TEST_F(CopyAnnosTest, BadHandlesAndMissingStatesAreReportedSourceFirst) {
     Doc bare(PlainDocument(4));
     ASSERT_EQ(ANInit(src, nullptr, nullptr, nullptr), AN_OK);
     ASSERT_EQ(ANInit(dest, nullptr, nullptr, nullptr), AN_OK);
-    Add(src, AN_TYPE_POINT, Point(1, Pos(1), 0));
+    ASSERT_EQ(AddPoint(src, Pos(1)), AN_OK);
 
     EXPECT_EQ(ANCopyAnnos(dest, nullptr), AN_ERR_BADARG);
-    EXPECT_EQ(ANCopyAnnos(nullptr, nullptr), AN_ERR_BADARG);
     EXPECT_EQ(ANCopyAnnos(dest, bare), AN_ERR_NOSTATE);
     EXPECT_EQ(ANCopyAnnos(nullptr, bare), AN_ERR_NOSTATE) << "the source is examined first";
     EXPECT_EQ(ANCopyAnnos(nullptr, src), AN_ERR_BADARG);
     EXPECT_EQ(ANCopyAnnos(bare, src), AN_ERR_NOSTATE);
-    EXPECT_EQ(StateOf(dest)->entries, nullptr);
-    EXPECT_EQ(Entries(src).size(), 1u);
+    EXPECT_EQ(annotest::TableOf(dest), nullptr);
+    EXPECT_EQ(ListedEntries(src).size(), 1u);
 }
 
 TEST_F(CopyAnnosTest, DataAccessFailuresArePassedOnAtEachLookup) {
@@ -229,44 +182,40 @@ TEST_F(CopyAnnosTest, DataAccessFailuresArePassedOnAtEachLookup) {
     struct Case {
         uint64_t failingLookup;
         size_t entriesCopied;
-        bool styleCopied;
     };
     // Lookups: the source, the destination, the destination again before the styles.
-    for (const Case c : {Case{1, 0, false}, Case{2, 0, false}, Case{3, 2, false}}) {
+    for (const Case c : {Case{1, 0}, Case{2, 0}, Case{3, 2}}) {
         Doc src(PlainDocument(4));
         Doc dest(PlainDocument(4));
         ASSERT_EQ(ANInit(src, nullptr, nullptr, nullptr), AN_OK);
         ASSERT_EQ(ANInit(dest, nullptr, nullptr, nullptr), AN_OK);
-        Add(src, AN_TYPE_POINT, Point(1, Pos(1), 0));
-        Add(src, AN_TYPE_POINT, Point(2, Pos(2), 0));
+        ASSERT_EQ(AddPoint(src, Pos(1), 1), AN_OK);
+        ASSERT_EQ(AddPoint(src, Pos(2), 2), AN_OK);
         ASSERT_EQ(ANAddHiliteStyle(src, &s), AN_OK);
 
         antk::failCall(Fn::DAGetAnno, c.failingLookup, 77);
         EXPECT_EQ(ANCopyAnnos(dest, src), 77u) << c.failingLookup;
         antk::clearFailures();
-        EXPECT_EQ(Entries(dest).size(), c.entriesCopied) << c.failingLookup;
-        EXPECT_EQ(ANGetHiliteStyle(dest, 7, nullptr), c.styleCopied ? 1u : 0u);
+        EXPECT_EQ(ListedEntries(dest).size(), c.entriesCopied) << c.failingLookup;
+        EXPECT_EQ(ANGetHiliteStyle(dest, 7, nullptr), 0u) << c.failingLookup;
     }
 }
 
 TEST_F(CopyAnnosTest, CopyingADocumentOntoItselfLeavesItAsItWas) {
     Doc doc(PlainDocument(10));
-    int calls = 0;
-    ASSERT_EQ(ANInit(doc, nullptr, CountCalls, &calls), AN_OK);
+    Notifications calls;
+    ASSERT_EQ(ANInit(doc, nullptr, Notifications::Callback, &calls), AN_OK);
     FillSource(doc);
-    ANRangeDesc range{sizeof(ANRangeDesc), 0x33, Pos(7), Pos(8), 0};
-    ASSERT_EQ(ANAddAnno(doc, AN_TYPE_RANGE, &range), AN_OK);
-    calls = 0;
+    ASSERT_EQ(AddRange(doc, Pos(7), Pos(8), 0x33), AN_OK);
+    calls.calls.clear();
     const std::string tableBefore = TableBytes(doc);
     const std::string stylesBefore = StyleBytes(doc);
-    const uint16_t stylesCount = StateOf(doc)->styles->count;
 
     EXPECT_EQ(ANCopyAnnos(doc, doc), AN_OK);
 
     EXPECT_EQ(TableBytes(doc), tableBefore);
     EXPECT_EQ(StyleBytes(doc), stylesBefore);
-    EXPECT_EQ(StateOf(doc)->styles->count, stylesCount);
-    EXPECT_EQ(calls, 0);
+    EXPECT_TRUE(calls.calls.empty());
 }
 
 #if ANNO_HAVE_PLATFORM_CONTROLS
@@ -283,28 +232,24 @@ void InitWithoutStyleTable(DAHandle doc) {
 TEST_F(CopyAnnosTest, MissingStyleTablesOnEitherSideLeaveTheEntriesCopied) {
     ANNO_REQUIRE_PLATFORM_CONTROLS();
 #if ANNO_HAVE_PLATFORM_CONTROLS
-    {
+    const ANHiliteStyle s = Style(7, 1);
+    for (const bool srcHasStyles : {false, true}) {
         Doc src(PlainDocument(4));
         Doc dest(PlainDocument(4));
-        InitWithoutStyleTable(src);
-        ASSERT_EQ(ANInit(dest, nullptr, nullptr, nullptr), AN_OK);
-        Add(src, AN_TYPE_POINT, Point(1, Pos(1), 0));
+        if (srcHasStyles) {
+            ASSERT_EQ(ANInit(src, nullptr, nullptr, nullptr), AN_OK);
+            ASSERT_EQ(ANAddHiliteStyle(src, &s), AN_OK);
+            InitWithoutStyleTable(dest);
+        } else {
+            InitWithoutStyleTable(src);
+            ASSERT_EQ(ANInit(dest, nullptr, nullptr, nullptr), AN_OK);
+        }
+        ASSERT_EQ(AddPoint(src, Pos(1)), AN_OK);
         antk::resetCalls();
         EXPECT_EQ(ANCopyAnnos(dest, src), AN_OK);
-        EXPECT_EQ(antk::calls(Fn::DAGetAnno), 2u) << "no styles: no second destination lookup";
-        EXPECT_EQ(Entries(dest).size(), 1u);
-    }
-    {
-        Doc src(PlainDocument(4));
-        Doc dest(PlainDocument(4));
-        ASSERT_EQ(ANInit(src, nullptr, nullptr, nullptr), AN_OK);
-        InitWithoutStyleTable(dest);
-        Add(src, AN_TYPE_POINT, Point(1, Pos(1), 0));
-        const ANHiliteStyle s = Style(7, 1);
-        ASSERT_EQ(ANAddHiliteStyle(src, &s), AN_OK);
-        EXPECT_EQ(ANCopyAnnos(dest, src), AN_OK);
-        EXPECT_EQ(Entries(dest).size(), 1u);
-        EXPECT_EQ(StateOf(dest)->styles, nullptr);
+        // Without source styles there is no second lookup of the destination.
+        EXPECT_EQ(antk::calls(Fn::DAGetAnno), srcHasStyles ? 3u : 2u);
+        EXPECT_EQ(ListedEntries(dest).size(), 1u);
     }
 #endif
 }
@@ -316,9 +261,11 @@ TEST_F(CopyAnnosTest, OutOfMemoryAnywhereLosesOnlyCopiesAndLeaksNothing) {
     ASSERT_EQ(ANInit(src, nullptr, nullptr, nullptr), AN_OK);
     FillSource(src);
     // Enough entries that the destination's table grows while copying.
-    for (uint32_t i = 0; i < 10; ++i) Add(src, AN_TYPE_VALUE, Point(0x100 + i, Pos(i + 1), 0));
-    AddText(src, 0x56, Pos(9), u"defg");
-    const std::vector<EntryView> source = Entries(src);
+    for (uint32_t i = 0; i < 10; ++i) {
+        ASSERT_EQ(AddPoint(src, Pos(i + 1), 0x100 + i, 0, AN_TYPE_VALUE), AN_OK);
+    }
+    ASSERT_EQ(AddText(src, Pos(9), u"defg", 0x56), AN_OK);
+    const std::vector<Listed> source = ListedEntries(src);
     const std::string srcBytes = TableBytes(src);
 
     uint64_t needed = 0;
@@ -328,7 +275,7 @@ TEST_F(CopyAnnosTest, OutOfMemoryAnywhereLosesOnlyCopiesAndLeaksNothing) {
         anwin::resetCounters();
         ASSERT_EQ(ANCopyAnnos(dest, src), AN_OK);
         needed = anwin::allocations();
-        ASSERT_EQ(Entries(dest).size(), source.size());
+        ASSERT_EQ(ListedEntries(dest).size(), source.size());
     }
     ASSERT_GE(needed, 5u) << "table, growth, two texts and the style array";
 
@@ -341,12 +288,13 @@ TEST_F(CopyAnnosTest, OutOfMemoryAnywhereLosesOnlyCopiesAndLeaksNothing) {
         anwin::clearFailures();
         EXPECT_EQ(TableBytes(src), srcBytes) << "allocation " << n;
         EXPECT_TRUE(TableInvariantsHold(dest)) << "allocation " << n;
-        const std::vector<EntryView> copied = Entries(dest);
+        const std::vector<Listed> copied = ListedEntries(dest);
         EXPECT_LE(copied.size(), source.size());
-        size_t from = 0;  // copies appear in source order
-        for (const EntryView &e : copied) {
-            while (from < source.size() && !e.sameAnnotation(source[from])) ++from;
-            EXPECT_LT(from, source.size()) << ::testing::PrintToString(e) << " at " << n;
+        EXPECT_GE(copied.size() + 1, source.size()) << "at most one copy lost, at " << n;
+        size_t from = 0;  // the copies that made it, in source order
+        for (const Listed &e : copied) {
+            while (from < source.size() && !SameAnnotation(e, source[from])) ++from;
+            EXPECT_LT(from, source.size()) << "allocation " << n;
             ++from;
         }
     }
