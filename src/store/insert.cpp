@@ -227,9 +227,14 @@ void ShiftTextPositions(ANEntryTable *table, uint16_t type, ANAnnoRecord *record
             }
         } else {
             if (HasExtent(entry.type) && ANPosEqual(end, anchor)) {
-                // A range that ended at the anchor now ends where the new text begins.
-                end.kind = ANPOS_ANNOTEXT;
-                end.textIndex = b;
+                // A range that ended at the anchor now ends where the new text begins,
+                // unless that would put its end before its start: an empty range at the
+                // anchor, or one from an item to its first character, whose text sorts
+                // before the item itself. Those keep their end and cover no new text.
+                ANPos moved = end;
+                moved.kind = ANPOS_ANNOTEXT;
+                moved.textIndex = b;
+                if (ANPosAtOrBefore(start, moved)) end = moved;
             }
             const bool bothText = entry.type == AN_TYPE_TEXT && type == AN_TYPE_TEXT;
             if (!HasExtent(entry.type) && !bothText && ANPosEqual(start, anchor)) {
