@@ -350,11 +350,16 @@ AN_API uint32_t ANNextChunkerPos(DAHandle doc, const ANPos *pos, ANPos *next);
  * failure, 18, or 25 when there is none. */
 AN_API uint32_t ANNextAnnoTextPos(DAHandle doc, const ANPos *pos, ANPos *next);
 
-/* Maps a document-wide character ordinal to a position (flags bit 0) or a position
- * to an ordinal (bit 1). Only pos.itemId and pos.subItemId are read or written.
- * Returns 0; 15 (null doc, size not 28, no flag, a map that cannot be used); a
- * DAGetAnno failure; 18 (no state, or the content could not be opened); 25 (unknown
- * ordinal or position); 13 (out of memory). */
+/* Maps a document-wide character ordinal to a position (flags bit 0, which wins) or a
+ * position to an ordinal (bit 1). Only pos.itemId and pos.subItemId are read or
+ * written, and only on success; (item, 0xFFFFFFFF) maps to the item's first character
+ * or the first one after it. The character maps of the two most recently used chunks
+ * stay cached until ANDeInit. Returns 0 (also without writing when the chunk's content
+ * gave no characters); 15 (null doc or record, size not 28, no flag, a map that cannot
+ * be made or locked); a DAGetAnno failure; 18 (no state, or the content could not be
+ * opened: it is not tried again); 25 (an ordinal or position the chunker does not
+ * know, or past what the chunk's content gave); 13 (out of memory). A map that failed
+ * for memory, a lock or the chunker is not kept: a later call tries again. */
 AN_API uint32_t ANMapPosition(DAHandle doc, ANMapRecord *map);
 
 /* ---- Highlight styles ------------------------------------------------------------------------------------------------- */

@@ -122,6 +122,7 @@ void clearFailures() {
         r.clear();
     }
     c.anyRule.clear();
+    detail::clearContentReadHook();
 }
 
 int openSecondaryDocuments() { return detail::openSecondaryCount.load(); }

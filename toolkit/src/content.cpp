@@ -8,7 +8,10 @@
 // span, or as a single piece marked not taken.
 #include <algorithm>
 #include <cstring>
+#include <functional>
+#include <mutex>
 #include <new>
+#include <utility>
 
 #include "model.h"
 
@@ -106,6 +109,27 @@ uint32_t readNext(CAContent &ca, CAReadRecord *rec) {
     return 0;
 }
 
+struct ReadHook {
+    std::mutex mutex;
+    std::function<void(CAReadRecord *)> fn;
+};
+
+ReadHook &readHook() {
+    static ReadHook hook;
+    return hook;
+}
+
+void runReadHook(CAReadRecord *rec) {
+    std::function<void(CAReadRecord *)> fn;
+    {
+        std::lock_guard<std::mutex> guard(readHook().mutex);
+        fn = readHook().fn;
+    }
+    if (fn) {
+        fn(rec);
+    }
+}
+
 bool validRecord(const CAReadRecord *rec) {
     return rec != nullptr && rec->size == sizeof(CAReadRecord);
 }
@@ -163,7 +187,11 @@ uint32_t CAReadNext(CAHandle content, CAReadRecord *read) {
     if (content == nullptr || !validRecord(read)) {
         return kErrBadArgument;
     }
-    return readNext(*content, read);
+    const uint32_t rc = readNext(*content, read);
+    if (rc == 0) {
+        runReadHook(read);
+    }
+    return rc;
 }
 
 // position[0] is an item id: reading starts at that item and ends with its chunk.
@@ -200,3 +228,14 @@ uint32_t CACloseContent(CAHandle content) {
 }
 
 }  // extern "C"
+
+namespace antk {
+
+void setContentReadHook(std::function<void(CAReadRecord *)> hook) {
+    std::lock_guard<std::mutex> guard(readHook().mutex);
+    readHook().fn = std::move(hook);
+}
+
+void detail::clearContentReadHook() { setContentReadHook(nullptr); }
+
+}  // namespace antk

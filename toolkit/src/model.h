@@ -142,6 +142,9 @@ constexpr uint32_t kErrNoMemory = antk::kErrNoMemory;
 // Counts a call of `fn`; true when an injected failure hits it, with its code in `code`.
 bool failing(Fn fn, uint32_t &code) noexcept;
 
+// Removes the hook of setContentReadHook.
+void clearContentReadHook();
+
 extern std::atomic<int> openSecondaryCount;
 extern std::atomic<int> openContentCount;
 

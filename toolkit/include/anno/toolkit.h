@@ -25,11 +25,14 @@
 #define ANNO_TOOLKIT_H
 
 #include <cstdint>
+#include <functional>
 #include <string>
 #include <string_view>
 #include <vector>
 
 #include "anno/anno.h"
+
+struct CAReadRecord;  // hosts/modules.h
 
 #if defined(_WIN32)
 #if defined(ANNO_BUILDING_TOOLKIT)
@@ -179,8 +182,13 @@ ANTK_API void resetCalls();
 ANTK_API void failCall(Fn fn, uint64_t n, uint32_t code = 99, bool sticky = false);
 // Makes the n-th call of any module function from now fail (for sweeps).
 ANTK_API void failAnyCall(uint64_t n, uint32_t code = 99, bool sticky = false);
-// Removes every injected failure.
+// Removes every injected failure, and the content-read hook.
 ANTK_API void clearFailures();
+
+// Plays a content-access module that reports odd values: `hook` is called after every
+// successful CAReadNext has filled the record and may change what it reports (the
+// reader's own place is not affected). An empty function removes it.
+ANTK_API void setContentReadHook(std::function<void(CAReadRecord *)> hook);
 
 // Slot 151 of a document's module data, for tests that look at the binding.
 ANTK_API void *annoSlot(DAHandle doc);
