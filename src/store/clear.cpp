@@ -1,0 +1,330 @@
+// Clearing annotations by tag, with what removing annotation text entails: the text
+// positions at its anchor are renumbered, annotations left with nothing to cover go,
+// and two texts that a removed placeholder separated become one. Also freeing the
+// userData blocks that callers handed over with their annotations.
+#include <cstring>
+
+#include "anno/anno.h"
+#include "binding/instance.h"
+#include "binding/module_lock.h"
+#include "hosts/heap.h"
+#include "hosts/modules.h"
+#include "positions/order.h"
+#include "store/table.h"
+
+namespace {
+
+constexpr uint32_t kTextStep = 64;  // text buffers grow by this many units
+constexpr uint32_t kStatusOk = AN_OK;
+
+// A clear walks the ordered list; `cursor` is the entry it goes on with. Releasing
+// that entry as a side effect moves the cursor on to the entry that followed it.
+struct ANClearWalk {
+    ANInstance *instance;
+    ANEntryTable *table;
+    uint16_t cursor;
+};
+
+bool ANIsTextType(uint16_t type) { return type == AN_TYPE_TEXT || type == AN_TYPE_PLACEHOLDER; }
+
+bool ANIsRangeType(uint16_t type) {
+    return type == AN_TYPE_HILITE || type == AN_TYPE_RANGE || type == AN_TYPE_CUTMARK;
+}
+
+// Units of annotation text an entry holds: its text for type 5, one for type 6.
+uint32_t ANTextUnits(const ANEntry &entry) {
+    if (entry.type == AN_TYPE_TEXT) return entry.record.textLength;
+    return entry.type == AN_TYPE_PLACEHOLDER ? 1 : 0;
+}
+
+bool ANIsSelected(uint32_t tag, uint16_t flags, uint32_t value) {
+    if (flags == 0) return (tag & ANTAG_PROTECTED) == 0;
+    if ((flags & ANCLEAR_EQUAL) != 0) return tag == value;
+    if ((flags & ANCLEAR_MASK) != 0) return (tag & value) == value;
+    return false;
+}
+
+void ANUnlink(ANEntryTable *table, uint16_t index) {
+    const ANEntry &entry = ANSlot(table, index);
+    if (entry.prev != AN_NONE) {
+        ANSlot(table, entry.prev).next = entry.next;
+    } else {
+        table->first = entry.next;
+    }
+    if (entry.next != AN_NONE) {
+        ANSlot(table, entry.next).prev = entry.prev;
+    } else {
+        table->last = entry.prev;
+    }
+}
+
+// Links an entry that is in no list into the ordered list just before `before`.
+void ANLinkBefore(ANEntryTable *table, uint16_t index, uint16_t before) {
+    ANEntry &entry = ANSlot(table, index);
+    ANEntry &successor = ANSlot(table, before);
+    entry.prev = successor.prev;
+    entry.next = before;
+    if (successor.prev != AN_NONE) {
+        ANSlot(table, successor.prev).next = index;
+    } else {
+        table->first = index;
+    }
+    successor.prev = index;
+}
+
+// Puts an unlinked slot at the front of the free list, so the next insertion reuses
+// it first. A removal always leaves room, hence `full` is lifted.
+void ANPushFree(ANEntryTable *table, uint16_t index) {
+    ANEntry &entry = ANSlot(table, index);
+    entry.prev = AN_NONE;
+    entry.next = table->freeFirst;
+    if (table->freeFirst != AN_NONE) {
+        ANSlot(table, table->freeFirst).prev = index;
+    } else {
+        table->freeLast = index;
+    }
+    table->freeFirst = index;
+    table->count--;
+    table->full = 0;
+}
+
+// Gives back the slot of an unlinked entry; a move event can no longer refer to it.
+void ANGiveBack(ANClearWalk &walk, uint16_t index) {
+    ANPushFree(walk.table, index);
+    if (walk.instance->hoverEntry == index) ANResetHover(walk.instance);
+}
+
+// Releases an entry that a removal takes with it, without telling the callback.
+void ANDropEntry(ANClearWalk &walk, uint16_t index) {
+    ANEntry &entry = ANSlot(walk.table, index);
+    if (walk.cursor == index) walk.cursor = entry.next;
+    ANUnlink(walk.table, index);
+    if (entry.type == AN_TYPE_TEXT) {
+        ANHeapFree(entry.record.textBuffer);
+        entry.record.textBuffer = nullptr;
+    }
+    ANGiveBack(walk, index);
+}
+
+// The text at an anchor loses `length` units from index `offset` on. Units behind them
+// move down; a position on a removed unit goes to `collapse`.
+struct ANTextCut {
+    ANPos anchor;  // the removed entry's start: itemId and subItemId name the anchor
+    uint32_t offset;
+    uint32_t length;
+    ANPos collapse;
+};
+
+void ANRenumberPos(ANPos &pos, const ANTextCut &cut) {
+    if (pos.kind != ANPOS_ANNOTEXT || !ANSameAnchor(pos, cut.anchor)) return;
+    if (pos.textIndex < cut.offset) return;
+    if (pos.textIndex - cut.offset >= cut.length) {
+        pos.textIndex -= cut.length;
+    } else {
+        pos = cut.collapse;
+    }
+}
+
+// Brings an entry whose extent the renumbering emptied or turned round back to a
+// valid one: a range that covers nothing goes, a point covers one step again.
+void ANRestoreExtent(ANClearWalk &walk, uint16_t index) {
+    ANAnnoRecord &record = ANSlot(walk.table, index).record;
+    const int16_t order = ANComparePos(record.start, record.end);
+    if (order < 0) return;
+    if (ANIsRangeType(ANSlot(walk.table, index).type)) {
+        ANDropEntry(walk, index);
+    } else if (order == 0) {
+        record.end = ANStepAfter(record.end);
+    } else {
+        record.end = ANStepAfter(record.start);
+    }
+}
+
+// Renumbers the positions of every entry listed up to the anchor's content position,
+// which covers every entry with a position in the anchor's text.
+void ANRenumber(ANClearWalk &walk, const ANTextCut &cut) {
+    const ANPos content{cut.anchor.itemId, cut.anchor.subItemId, 0, 0};
+    uint16_t index = walk.table->first;
+    while (index != AN_NONE) {
+        ANEntry &entry = ANSlot(walk.table, index);
+        if (ANComparePos(entry.record.start, content) > 0) break;
+        const uint16_t next = entry.next;
+        ANRenumberPos(entry.record.start, cut);
+        ANRenumberPos(entry.record.end, cut);
+        ANRestoreExtent(walk, index);
+        index = next;
+    }
+}
+
+// Appends the text of `after` to `before`, releases `after`, and gives `before` the
+// place `after` had: its positions, and a list position behind the annotations that
+// now lie inside its text. Out of memory leaves both texts as they are.
+uint32_t ANJoinTexts(ANClearWalk &walk, uint16_t before, uint16_t after, uint32_t offset) {
+    ANEntryTable *table = walk.table;
+    ANAnnoRecord &kept = ANSlot(table, before).record;
+    ANAnnoRecord &gone = ANSlot(table, after).record;
+    const uint64_t total = uint64_t{kept.textLength} + gone.textLength;
+    uint64_t capacity = kept.textCapacity;
+    while (capacity <= total) capacity += kTextStep;
+    if (capacity > UINT32_MAX) return AN_ERR_NOMEM;
+    if (capacity != kept.textCapacity) {
+        // One reallocation to the final size: a failure leaves the buffer untouched.
+        void *grown = ANHeapReAlloc(kept.textBuffer, capacity * sizeof(uint16_t));
+        if (grown == nullptr) return AN_ERR_NOMEM;
+        kept.textBuffer = static_cast<uint16_t *>(grown);
+        kept.textCapacity = static_cast<uint32_t>(capacity);
+    }
+    if (gone.textLength != 0) {
+        std::memcpy(kept.textBuffer + kept.textLength, gone.textBuffer,
+                    gone.textLength * sizeof(uint16_t));
+    }
+    kept.textLength = static_cast<uint32_t>(total);
+    const uint32_t goneLength = gone.textLength;
+    kept.start = gone.start;
+    kept.end = gone.end;
+    const ANPos anchor = kept.start;
+    ANDropEntry(walk, after);
+
+    const uint32_t limit = offset + goneLength;
+    uint16_t index = ANSlot(table, before).next;
+    while (index != AN_NONE) {
+        const ANPos &start = ANSlot(table, index).record.start;
+        if (start.kind != ANPOS_ANNOTEXT || !ANSameAnchor(start, anchor) ||
+            start.textIndex >= limit) {
+            break;
+        }
+        const uint16_t next = ANSlot(table, index).next;
+        ANUnlink(table, index);
+        ANLinkBefore(table, index, before);
+        index = next;
+    }
+    return kStatusOk;
+}
+
+// Fixes the annotation text at the anchor of a removed (already unlinked) text entry.
+// Returns 13 when the join of the texts around a placeholder ran out of memory.
+uint32_t ANFixText(ANClearWalk &walk, uint16_t removed) {
+    ANEntryTable *table = walk.table;
+    const ANEntry &entry = ANSlot(table, removed);
+    const ANPos anchor = entry.record.start;
+
+    uint32_t offset = 0;
+    uint16_t before = AN_NONE;
+    bool textSeen = false;
+    for (uint16_t i = entry.prev;
+         i != AN_NONE && ANSameAnchor(ANSlot(table, i).record.start, anchor);
+         i = ANSlot(table, i).prev) {
+        const ANEntry &other = ANSlot(table, i);
+        if (!ANIsTextType(other.type)) continue;
+        offset += ANTextUnits(other);
+        if (!textSeen && other.type == AN_TYPE_TEXT) before = i;
+        textSeen = true;
+    }
+
+    uint16_t after = AN_NONE;
+    for (uint16_t i = entry.next;
+         i != AN_NONE && ANSameAnchor(ANSlot(table, i).record.start, anchor);
+         i = ANSlot(table, i).next) {
+        const uint16_t type = ANSlot(table, i).type;
+        if (type == AN_TYPE_PLACEHOLDER) break;
+        if (type == AN_TYPE_TEXT) {
+            after = i;
+            break;
+        }
+    }
+
+    ANTextCut cut{anchor, offset, ANTextUnits(entry), {}};
+    if (anchor.kind == ANPOS_ANNOTEXT) {
+        // Not the last text at the anchor: its units now begin where the removed ones did.
+        cut.collapse = ANPos{anchor.itemId, anchor.subItemId, ANPOS_ANNOTEXT, offset};
+    } else {
+        cut.collapse = ANPos{anchor.itemId, anchor.subItemId, 0, 0};
+    }
+    ANRenumber(walk, cut);
+
+    if (entry.type != AN_TYPE_PLACEHOLDER || before == AN_NONE || after == AN_NONE) {
+        return kStatusOk;
+    }
+    return ANJoinTexts(walk, before, after, offset);
+}
+
+// Removes a selected entry and announces it. Returns the new status of the clear.
+uint32_t ANRemoveEntry(ANClearWalk &walk, uint16_t index, uint32_t status) {
+    ANEntry &entry = ANSlot(walk.table, index);
+    ANUnlink(walk.table, index);
+    if (ANIsTextType(entry.type) && ANFixText(walk, index) != kStatusOk) status = AN_ERR_NOMEM;
+    if (entry.type == AN_TYPE_TEXT) {
+        ANHeapFree(entry.record.textBuffer);
+        entry.record.textBuffer = nullptr;
+    }
+    ANGiveBack(walk, index);
+    // The record stays readable in the free slot for the length of the call.
+    if (walk.instance->callback != nullptr) {
+        status = ANNotify(walk.instance, ANNOTIFY_REMOVED, entry.type, &entry.record);
+    }
+    return status;
+}
+
+bool ANOwnsUserData(const ANEntry &entry) {
+    const bool blockType =
+        entry.type == AN_TYPE_HILITE || entry.type == AN_TYPE_RANGE || entry.type == AN_TYPE_TEXT;
+    return blockType && (entry.flags & ANENTRY_OWNS_USERDATA) != 0 && entry.record.userData != 0;
+}
+
+// Frees every userData block an entry was given to own, once per block: later entries
+// holding the same value lose it before it is freed.
+void ANFreeUserDataBlocks(ANEntryTable *table) {
+    for (uint16_t i = table->first; i != AN_NONE; i = ANSlot(table, i).next) {
+        ANEntry &entry = ANSlot(table, i);
+        if (!ANOwnsUserData(entry)) continue;
+        const uint64_t block = entry.record.userData;
+        for (uint16_t j = entry.next; j != AN_NONE; j = ANSlot(table, j).next) {
+            ANEntry &other = ANSlot(table, j);
+            if (other.record.userData != block) continue;
+            other.record.userData = 0;
+            other.flags = static_cast<uint16_t>(other.flags & ~ANENTRY_OWNS_USERDATA);
+        }
+        ANHeapFree(reinterpret_cast<void *>(static_cast<uintptr_t>(block)));
+        entry.record.userData = 0;
+        entry.flags = static_cast<uint16_t>(entry.flags & ~ANENTRY_OWNS_USERDATA);
+    }
+}
+
+}  // namespace
+
+extern "C" AN_API uint32_t ANClearAnnos(DAHandle doc, uint16_t flags, uint32_t value) {
+    ANInstance *instance = nullptr;
+    const uint32_t rc = ANFindState(doc, &instance);
+    if (rc != AN_OK) return rc;
+    ANEntryTable *table = instance->entries;
+    if (table == nullptr) return AN_OK;
+
+    ANClearWalk walk{instance, table, table->first};
+    uint32_t status = kStatusOk;
+    while (walk.cursor != AN_NONE) {
+        const uint16_t index = walk.cursor;
+        walk.cursor = ANSlot(table, index).next;
+        if (ANIsSelected(ANSlot(table, index).record.tag, flags, value)) {
+            status = ANRemoveEntry(walk, index, status);
+        }
+    }
+    if (table->count == 0) {
+        ANFreeTable(table);
+        instance->entries = nullptr;
+    }
+    return status;
+}
+
+extern "C" AN_API uint32_t ANClearUserData(DAHandle doc) {
+    if (doc == nullptr) return AN_ERR_BADARG;
+    DARetrievedDoc retrieved = nullptr;
+    const uint32_t rc = DARetrieveDocHandle(doc, &retrieved);
+    if (rc != 0) return rc;
+    ANModuleDataLock lock(retrieved);
+    void **slots = lock.slots();
+    if (slots == nullptr) return AN_OK;
+    auto *instance = static_cast<ANInstance *>(slots[ANMOD_SLOT_ANNO]);
+    if (instance == nullptr || instance->entries == nullptr) return AN_OK;
+    ANFreeUserDataBlocks(instance->entries);
+    return AN_OK;
+}
