@@ -375,8 +375,10 @@ AN_API uint32_t ANDeInitGlobalHiliteStyles(ANStyleTable *table);
  * found, 15 null table, 25 not found (*style untouched). */
 AN_API uint32_t ANGetGlobalHiliteStyle(ANStyleTable *table, uint32_t styleId, ANHiliteStyle *style);
 
-/* Adds a 28- or 24-byte style record, replacing the one with the same id. Returns 0,
- * 15 (null table or record, other size), 13 (out of memory: the table unchanged). */
+/* Adds a 28- or 24-byte style record, replacing the one with the same id. A 24-byte
+ * record is stored widened, with attr2 0xFFFF and reserved 0. Returns 0, 15 (null
+ * table or record, other size), 13 (out of memory, or a new id when the table already
+ * holds 65529 styles: the table unchanged). */
 AN_API uint32_t ANAddGlobalHiliteStyle(ANStyleTable *table, const ANHiliteStyle *style);
 
 /* Looks a style up in the document's table, then in its global table. Returns 1 when
@@ -389,8 +391,10 @@ AN_API uint32_t ANAddHiliteStyle(DAHandle doc, const ANHiliteStyle *style);
 
 /* ---- Tracking ------------------------------------------------------------------------------------------------------------- */
 
-/* Starts a drawing walk at `start`. Returns ANTRACK_NONE (no state or no
- * annotations), ANTRACK_NOMORE (nothing reaches `start`) or ANTRACK_ACTIVE. */
+/* Starts a drawing walk at `start`. Returns ANTRACK_NONE (null pointer, no state:
+ * the record untouched; no annotations: only rangeActive and the three style flags
+ * cleared), ANTRACK_NOMORE (nothing reaches `start`) or ANTRACK_ACTIVE. markActive is
+ * left as the caller had it. */
 AN_API uint32_t ANStartAnnoTrack(DAHandle doc, const ANPos *start, ANTrackInfo *track);
 
 /* Ends a drawing walk. Reads nothing, changes nothing, returns 0. */

@@ -10,6 +10,7 @@
 #include "hosts/heap.h"
 #include "hosts/modules.h"
 #include "positions/order.h"
+#include "store/store.h"
 #include "store/table.h"
 
 namespace {
@@ -44,53 +45,9 @@ bool ANIsSelected(uint32_t tag, uint16_t flags, uint32_t value) {
     return false;
 }
 
-void ANUnlink(ANEntryTable *table, uint16_t index) {
-    const ANEntry &entry = ANSlot(table, index);
-    if (entry.prev != AN_NONE) {
-        ANSlot(table, entry.prev).next = entry.next;
-    } else {
-        table->first = entry.next;
-    }
-    if (entry.next != AN_NONE) {
-        ANSlot(table, entry.next).prev = entry.prev;
-    } else {
-        table->last = entry.prev;
-    }
-}
-
-// Links an entry that is in no list into the ordered list just before `before`.
-void ANLinkBefore(ANEntryTable *table, uint16_t index, uint16_t before) {
-    ANEntry &entry = ANSlot(table, index);
-    ANEntry &successor = ANSlot(table, before);
-    entry.prev = successor.prev;
-    entry.next = before;
-    if (successor.prev != AN_NONE) {
-        ANSlot(table, successor.prev).next = index;
-    } else {
-        table->first = index;
-    }
-    successor.prev = index;
-}
-
-// Puts an unlinked slot at the front of the free list, so the next insertion reuses
-// it first. A removal always leaves room, hence `full` is lifted.
-void ANPushFree(ANEntryTable *table, uint16_t index) {
-    ANEntry &entry = ANSlot(table, index);
-    entry.prev = AN_NONE;
-    entry.next = table->freeFirst;
-    if (table->freeFirst != AN_NONE) {
-        ANSlot(table, table->freeFirst).prev = index;
-    } else {
-        table->freeLast = index;
-    }
-    table->freeFirst = index;
-    table->count--;
-    table->full = 0;
-}
-
 // Gives back the slot of an unlinked entry; a move event can no longer refer to it.
 void ANGiveBack(ANClearWalk &walk, uint16_t index) {
-    ANPushFree(walk.table, index);
+    ANReleaseSlot(walk.table, index);
     if (walk.instance->hoverEntry == index) ANResetHover(walk.instance);
 }
 
@@ -98,7 +55,7 @@ void ANGiveBack(ANClearWalk &walk, uint16_t index) {
 void ANDropEntry(ANClearWalk &walk, uint16_t index) {
     ANEntry &entry = ANSlot(walk.table, index);
     if (walk.cursor == index) walk.cursor = entry.next;
-    ANUnlink(walk.table, index);
+    ANListRemove(walk.table, index);
     if (entry.type == AN_TYPE_TEXT) {
         ANHeapFree(entry.record.textBuffer);
         entry.record.textBuffer = nullptr;
@@ -140,14 +97,14 @@ void ANRestoreExtent(ANClearWalk &walk, uint16_t index) {
     }
 }
 
-// Renumbers the positions of every entry listed up to the anchor's content position,
-// which covers every entry with a position in the anchor's text.
+// Renumbers the positions of every entry listed up to the anchor, which covers every
+// entry with a position in the anchor's text: entries on the item itself sort before
+// text at one of its characters and must not end the walk.
 void ANRenumber(ANClearWalk &walk, const ANTextCut &cut) {
-    const ANPos content{cut.anchor.itemId, cut.anchor.subItemId, 0, 0};
     uint16_t index = walk.table->first;
     while (index != AN_NONE) {
         ANEntry &entry = ANSlot(walk.table, index);
-        if (ANComparePos(entry.record.start, content) > 0) break;
+        if (ANStartPastAnchor(entry.record.start, cut.anchor)) break;
         const uint16_t next = entry.next;
         ANRenumberPos(entry.record.start, cut);
         ANRenumberPos(entry.record.end, cut);
@@ -194,8 +151,8 @@ uint32_t ANJoinTexts(ANClearWalk &walk, uint16_t before, uint16_t after, uint32_
             break;
         }
         const uint16_t next = ANSlot(table, index).next;
-        ANUnlink(table, index);
-        ANLinkBefore(table, index, before);
+        ANListRemove(table, index);
+        ANListInsertAfter(table, index, ANSlot(table, before).prev);
         index = next;
     }
     return kStatusOk;
@@ -251,7 +208,7 @@ uint32_t ANFixText(ANClearWalk &walk, uint16_t removed) {
 // Removes a selected entry and announces it. Returns the new status of the clear.
 uint32_t ANRemoveEntry(ANClearWalk &walk, uint16_t index, uint32_t status) {
     ANEntry &entry = ANSlot(walk.table, index);
-    ANUnlink(walk.table, index);
+    ANListRemove(walk.table, index);
     if (ANIsTextType(entry.type) && ANFixText(walk, index) != kStatusOk) status = AN_ERR_NOMEM;
     if (entry.type == AN_TYPE_TEXT) {
         ANHeapFree(entry.record.textBuffer);

@@ -15,28 +15,11 @@
 #include "store/table.h"
 #include "styles/styles.h"
 #include "support/fixture.h"
+#include "support/invariants.h"
 
 namespace tracktest {
 
 inline int Cmp(const ANPos &a, const ANPos &b) { return ANCompPos(&a, &b); }
-
-// The table of a document as a list in list order.
-struct ListedEntry {
-    uint16_t slot;
-    uint16_t type;
-    const ANAnnoRecord *record;
-};
-
-inline std::vector<ListedEntry> ListOf(DAHandle doc) {
-    std::vector<ListedEntry> list;
-    const auto *state = static_cast<const ANInstance *>(antk::annoSlot(doc));
-    if (state == nullptr || state->entries == nullptr) return list;
-    const ANEntryTable *table = state->entries;
-    for (uint16_t i = table->first; i != AN_NONE; i = ANSlot(table, i).next) {
-        list.push_back({i, ANSlot(table, i).type, &ANSlot(table, i).record});
-    }
-    return list;
-}
 
 // What a style word gives, found the way a viewer would expect: palette colours for a
 // direct word, the document's style, then the global one, for a style number.
@@ -90,10 +73,10 @@ inline uint32_t BitOf(uint16_t type) {
 
 // Whether highlight `e` yields to `h`, the one in force: a highlight that runs on
 // further from a lower slot, or one of the very same extent, keeps out of the way.
-inline bool Yields(const ListedEntry &e, const ListedEntry &h) {
-    const int ends = Cmp(e.record->end, h.record->end);
+inline bool Yields(const annotest::Listed &e, const annotest::Listed &h) {
+    const int ends = Cmp(e.record.end, h.record.end);
     if (ends > 0 && e.slot < h.slot) return true;
-    return ends == 0 && Cmp(e.record->start, h.record->start) == 0;
+    return ends == 0 && Cmp(e.record.start, h.record.start) == 0;
 }
 
 struct WalkStats {
@@ -108,7 +91,7 @@ struct WalkStats {
 inline WalkStats CheckWalk(DAHandle doc, const ANPos &start, const std::vector<ANPos> &positions,
                            std::mt19937 &rng, double skip = 0.0, uint32_t markLeft = 0) {
     WalkStats stats;
-    const std::vector<ListedEntry> list = ListOf(doc);
+    const std::vector<annotest::Listed> list = annotest::ListedEntries(doc);
     std::vector<size_t> listIndex(65536, SIZE_MAX);
     for (size_t i = 0; i < list.size(); ++i) listIndex[list[i].slot] = i;
 
@@ -120,7 +103,7 @@ inline WalkStats CheckWalk(DAHandle doc, const ANPos &start, const std::vector<A
     // The start, from the head of the list.
     size_t firstNotBefore = list.size();
     for (size_t i = 0; i < list.size(); ++i) {
-        if (Cmp(list[i].record->start, start) > 0 || Cmp(list[i].record->end, start) >= 0) {
+        if (Cmp(list[i].record.start, start) > 0 || Cmp(list[i].record.end, start) >= 0) {
             firstNotBefore = i;
             break;
         }
@@ -140,9 +123,9 @@ inline WalkStats CheckWalk(DAHandle doc, const ANPos &start, const std::vector<A
         EXPECT_EQ(track.nextChange.subItemId, 0xFFFFFFFFu);
     } else {
         EXPECT_EQ(started, ANTRACK_ACTIVE);
-        const ListedEntry &e = list[firstNotBefore];
+        const annotest::Listed &e = list[firstNotBefore];
         EXPECT_EQ(track.cursor, e.slot);
-        const ANPos &expected = Cmp(e.record->start, start) < 0 ? start : e.record->start;
+        const ANPos &expected = Cmp(e.record.start, start) < 0 ? start : e.record.start;
         EXPECT_EQ(Cmp(track.nextChange, expected), 0);
     }
 
@@ -158,8 +141,8 @@ inline WalkStats CheckWalk(DAHandle doc, const ANPos &start, const std::vector<A
         SCOPED_TRACE(::testing::PrintToString(p));
 
         std::vector<uint16_t> cover;
-        for (const ListedEntry &e : list) {
-            if (Cmp(e.record->start, p) <= 0 && Cmp(p, e.record->end) < 0) cover.push_back(e.slot);
+        for (const annotest::Listed &e : list) {
+            if (Cmp(e.record.start, p) <= 0 && Cmp(p, e.record.end) < 0) cover.push_back(e.slot);
         }
         const ANTrackInfo before = track;
         const bool full = Cmp(p, before.nextChange) >= 0;
@@ -178,35 +161,35 @@ inline WalkStats CheckWalk(DAHandle doc, const ANPos &start, const std::vector<A
                               (previousHilite ? ANTRACK_BIT_HILITE : 0);
         uint64_t userData = before.userData;
         if (previousRange && before.cursor != AN_NONE) {
-            userData = list[listIndex[before.cursor]].record->userData;
+            userData = list[listIndex[before.cursor]].record.userData;
         }
         uint64_t value = before.value;
         const uint16_t *text = before.textBuffer;
         uint32_t textLength = before.textLength;
         bool range = false, mark = false;
-        const ListedEntry *hilite = nullptr;
+        const annotest::Listed *hilite = nullptr;
         for (uint16_t slot : cover) {
-            const ListedEntry &e = list[listIndex[slot]];
+            const annotest::Listed &e = list[listIndex[slot]];
             expectBits |= BitOf(e.type);
             switch (e.type) {
                 case AN_TYPE_HILITE:
                     if (hilite == nullptr || !Yields(e, *hilite)) {
                         hilite = &e;
-                        userData = e.record->userData;
+                        userData = e.record.userData;
                     }
                     break;
                 case AN_TYPE_POINT:
                 case AN_TYPE_VALUE:
-                    value = e.record->value;
+                    value = e.record.value;
                     break;
                 case AN_TYPE_RANGE:
                     range = true;
-                    userData = e.record->userData;
+                    userData = e.record.userData;
                     break;
                 case AN_TYPE_TEXT:
-                    userData = e.record->userData;
-                    text = e.record->textBuffer;
-                    textLength = e.record->textLength;
+                    userData = e.record.userData;
+                    text = e.record.textBuffer;
+                    textLength = e.record.textLength;
                     break;
                 case AN_TYPE_CUTMARK:
                     mark = true;
@@ -227,7 +210,7 @@ inline WalkStats CheckWalk(DAHandle doc, const ANPos &start, const std::vector<A
         if (hilite == nullptr) {
             EXPECT_EQ(track.color1Set + track.color2Set + track.attrSet, 0u);
         } else {
-            const ExpectedStyle s = StyleFor(doc, hilite->record->style);
+            const ExpectedStyle s = StyleFor(doc, hilite->record.style);
             EXPECT_EQ(track.color1Set, s.color1Set);
             EXPECT_EQ(track.color2Set, s.color2Set);
             EXPECT_EQ(track.attrSet, s.attrSet);
@@ -246,22 +229,22 @@ inline WalkStats CheckWalk(DAHandle doc, const ANPos &start, const std::vector<A
         // The cursor stays while its entry runs on past p; otherwise it moves to the
         // next entry not wholly before p. Every entry before it is over by p.
         size_t cursorAt = before.cursor == AN_NONE ? list.size() : listIndex[before.cursor];
-        if (cursorAt == list.size() || Cmp(list[cursorAt].record->end, p) <= 0) {
+        if (cursorAt == list.size() || Cmp(list[cursorAt].record.end, p) <= 0) {
             size_t i = before.cursor == AN_NONE ? 0 : cursorAt + 1;
-            while (i < list.size() && Cmp(list[i].record->start, p) <= 0 &&
-                   Cmp(list[i].record->end, p) < 0) {
+            while (i < list.size() && Cmp(list[i].record.start, p) <= 0 &&
+                   Cmp(list[i].record.end, p) < 0) {
                 ++i;
             }
             cursorAt = i;
         }
         EXPECT_EQ(track.cursor, cursorAt == list.size() ? AN_NONE : list[cursorAt].slot);
         for (size_t i = 0; i < std::min(cursorAt, list.size()); ++i) {
-            EXPECT_LE(Cmp(list[i].record->end, p), 0) << "slot " << list[i].slot;
+            EXPECT_LE(Cmp(list[i].record.end, p), 0) << "slot " << list[i].slot;
         }
         // nextChange: the nearest start or end after p, or p when the cursor ends there.
         const ANPos *nearest = nullptr;
-        for (const ListedEntry &e : list) {
-            for (const ANPos *q : {&e.record->start, &e.record->end}) {
+        for (const annotest::Listed &e : list) {
+            for (const ANPos *q : {&e.record.start, &e.record.end}) {
                 if (Cmp(*q, p) > 0 && (nearest == nullptr || Cmp(*q, *nearest) < 0)) nearest = q;
             }
         }
@@ -270,7 +253,7 @@ inline WalkStats CheckWalk(DAHandle doc, const ANPos &start, const std::vector<A
             EXPECT_EQ(track.nextChange.itemId, 0xFFFFFFFFu);
             EXPECT_EQ(track.nextChange.subItemId, 0xFFFFFFFFu);
         } else {
-            const ANAnnoRecord &k = *list[cursorAt].record;
+            const ANAnnoRecord &k = list[cursorAt].record;
             EXPECT_TRUE(Cmp(k.start, p) > 0 || Cmp(k.end, p) >= 0);
             if (Cmp(k.start, p) <= 0 && Cmp(k.end, p) == 0) {
                 EXPECT_EQ(Cmp(track.nextChange, p), 0);
