@@ -93,7 +93,7 @@ class Fields {
  public:
     Fields(const Json &object, std::string where) : object_(object), where_(std::move(where)) {
         if (!object_.is_object()) {
-            fail("must be a JSON object");
+            fail("not a JSON object");
         }
     }
 

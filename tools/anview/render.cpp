@@ -183,6 +183,44 @@ std::string padded(const std::string &text, std::size_t width) {
     return columns >= width ? text : text + std::string(width - columns, ' ');
 }
 
+// The key to the marks, then one line per annotation of the file.
+void renderLegend(const Page &page, std::ostream &out, bool colour) {
+    out << '\n';
+    out << "Marks: " << kOpenText << "\u2026" << kCloseText << " inserted text, "
+        << kMarkPlaceholder << " placeholder, " << kMarkPoint << " point, " << kMarkValue
+        << " value, " << kMarkCut << " cut marker" << (colour ? "; underlined: range.\n" : ".\n");
+    if (!colour) {
+        out << "Under the text: a-z highlight colours (capital: also in a range), ~ range.\n";
+    }
+
+    out << "\nAnnotations\n";
+    std::size_t numberWidth = 0;
+    std::size_t kindWidth = 0;
+    std::size_t whereWidth = 0;
+    for (const LegendLine &line : page.legend) {
+        numberWidth = std::max(numberWidth, std::to_string(line.number).size() + 2);  // "[n]"
+        kindWidth = std::max(kindWidth, line.kind.size());
+        whereWidth = std::max(whereWidth, line.where.size());
+    }
+    for (const LegendLine &line : page.legend) {
+        // The key letter of a highlight, drawn in its colours on a colour terminal.
+        std::string key = colour ? "    " : "   ";
+        if (line.key >= 0) {
+            const ColourKey &colourKey = page.keys[static_cast<std::size_t>(line.key)];
+            key = colour ? sgr(colourKey.look) + " " + colourKey.letter + " " + kReset + " "
+                         : std::string(1, colourKey.letter) + "  ";
+        }
+        std::string text = "  " + padded("[" + std::to_string(line.number) + "]", numberWidth) +
+                           "  " + padded(line.kind, kindWidth) + "  " +
+                           padded(line.where, whereWidth) + "  " + key + line.detail;
+        if (!line.label.empty()) {
+            text += "  \"" + line.label + "\"";
+        }
+        text.erase(text.find_last_not_of(' ') + 1);
+        out << text << '\n';
+    }
+}
+
 }  // namespace
 
 void renderTerminal(const Page &page, std::ostream &out, uint32_t width, bool colour) {
@@ -200,47 +238,11 @@ void renderTerminal(const Page &page, std::ostream &out, uint32_t width, bool co
             }
         }
     }
-
-    out << '\n';
-    out << "Marks: " << kOpenText << "\u2026" << kCloseText << " inserted text, "
-        << kMarkPlaceholder << " placeholder, " << kMarkPoint << " point, " << kMarkValue
-        << " value, " << kMarkCut << " cut marker" << (colour ? "; underlined: range.\n" : ".\n");
-    if (!colour) {
-        out << "Under the text: a-z highlight colours (capital: also in a range), ~ range.\n";
-    }
-
-    out << '\n';
     if (page.legend.empty()) {
-        out << "Annotations: none\n";
+        out << "\nAnnotations: none\n";
     } else {
-        out << "Annotations\n";
-        std::size_t numberWidth = 0;
-        std::size_t kindWidth = 0;
-        std::size_t whereWidth = 0;
-        for (const LegendLine &line : page.legend) {
-            numberWidth = std::max(numberWidth, std::to_string(line.number).size() + 2);  // "[n]"
-            kindWidth = std::max(kindWidth, line.kind.size());
-            whereWidth = std::max(whereWidth, line.where.size());
-        }
-        for (const LegendLine &line : page.legend) {
-            // The key letter of a highlight, drawn in its colours on a colour terminal.
-            std::string key = colour ? "    " : "   ";
-            if (line.key >= 0) {
-                const ColourKey &colourKey = page.keys[static_cast<std::size_t>(line.key)];
-                key = colour ? sgr(colourKey.look) + " " + colourKey.letter + " " + kReset + " "
-                             : std::string(1, colourKey.letter) + "  ";
-            }
-            std::string text = "  " + padded("[" + std::to_string(line.number) + "]", numberWidth) +
-                               "  " + padded(line.kind, kindWidth) + "  " +
-                               padded(line.where, whereWidth) + "  " + key + line.detail;
-            if (!line.label.empty()) {
-                text += "  \"" + line.label + "\"";
-            }
-            text.erase(text.find_last_not_of(' ') + 1);
-            out << text << '\n';
-        }
+        renderLegend(page, out, colour);
     }
-
     if (page.hoverAsked) {
         out << "\nHover events\n";
         for (const std::string &line : page.hover) {
@@ -340,11 +342,12 @@ h1 { font-size: 1.3em; font-weight: normal; color: #555; }
 h2 { font-size: 1.1em; margin-top: 2em; }
 p.text { white-space: pre-wrap; }
 p.cut { color: #888; letter-spacing: 0.3em; }
-.ins { font-style: italic; }
-.mark { font-weight: bold; }
+.ins { font-style: italic; color: #6a3d9a; }
+.mark { font-weight: bold; color: #c62828; }
 table.legend { border-collapse: collapse; }
 table.legend td, table.legend th { padding: 0.2em 0.8em; text-align: left; vertical-align: top; }
 table.legend th { border-bottom: 1px solid #ccc; }
+table.legend td:nth-child(3) { white-space: nowrap; }
 .swatch { font-family: monospace; padding: 0 0.3em; }
 p.marks { color: #555; font-size: 0.9em; }
 </style>

@@ -95,8 +95,10 @@ class Drawer {
 
     // Content follows: the annotation text before it ends.
     void leaveText() {
-        flushPending();
-        closeText();
+        if (inText_) {
+            flushPending();
+            closeText();
+        }
     }
 
     void mark(const char *text, Look look) {
@@ -274,6 +276,11 @@ const Session::Item *Session::item(uint32_t id) const {
 // ---- Adding ---------------------------------------------------------------------------
 
 void Session::add(const AnnotationSet &set, const std::string &source) {
+    for (const AnnoSpec &anno : set.annotations) {
+        if (anno.kind == AnnoKind::Text || anno.kind == AnnoKind::Placeholder) {
+            textOffsets_.insert(anno.at);
+        }
+    }
     for (const StyleSpec &style : set.styles) {
         addStyle(style, source);
     }
@@ -360,10 +367,13 @@ void Session::addAnnotation(const AnnoSpec &anno, const std::string &where) {
         const ANPos start = charPosition(anno.start, where);
         ANPos end = start;
         if (anno.end > anno.start) {
-            // Just after the last character covered, before any annotation text anchored
-            // at the next one, so that such text stays outside whatever the order of adding.
+            // Just after the last character covered. Where the file anchors annotation text
+            // at the next character, before that text, so that it stays outside whatever
+            // the order of adding; elsewhere at the next character itself, so that ranges
+            // that meet are joined.
             const ANPos last = charPosition(anno.end - 1, where);
-            end = ANPos{last.itemId, last.subItemId + 1, ANPOS_ANNOTEXT, 0};
+            const bool textAtEnd = textOffsets_.count(anno.end) != 0;
+            end = ANPos{last.itemId, last.subItemId + 1, textAtEnd ? ANPOS_ANNOTEXT : 0, 0};
         }
         if (anno.kind == AnnoKind::Highlight) {
             ANAnnoRecord record{};
@@ -683,7 +693,9 @@ std::vector<LegendLine> Session::legend(const AnnotationSet &set, std::vector<Co
         line.label = anno.label;
         auto at = [&](const ANPos &pos) {
             std::string text = "at " + std::to_string(ordinalOf(pos));
-            if (pos.kind == ANPOS_ANNOTEXT && pos.textIndex != 0) {
+            // An empty text has no unit of its own to give an index to.
+            const bool empty = anno.kind == AnnoKind::Text && anno.text.empty();
+            if (pos.kind == ANPOS_ANNOTEXT && pos.textIndex != 0 && !empty) {
                 text += ", index " + std::to_string(pos.textIndex);
             }
             return text;
@@ -722,7 +734,9 @@ std::vector<LegendLine> Session::legend(const AnnotationSet &set, std::vector<Co
         } else if (found.empty()) {
             line.where = anno.kind == AnnoKind::Highlight ? offsetRange(anno.start, anno.end)
                                                           : "at " + std::to_string(anno.at);
-            line.detail = "no entry found";
+            line.detail = anno.kind == AnnoKind::Text
+                              ? "appended to the annotation text already there"
+                              : "no entry found";
         } else {
             const Found &entry = found.front();
             switch (anno.kind) {

@@ -8,6 +8,7 @@
 #include <cstdint>
 #include <map>
 #include <memory>
+#include <set>
 #include <string>
 #include <unordered_map>
 #include <vector>
@@ -100,6 +101,8 @@ class Session {
     uint32_t length_ = 0;
     // Units of annotation text added so far at each offset, to check "index" fields.
     std::map<uint32_t, uint32_t> textUnits_;
+    // Offsets where the annotation file anchors annotation text.
+    std::set<uint32_t> textOffsets_;
     uint64_t insertedUnits_ = 0;
     std::vector<Event> events_;
 };
