@@ -1,6 +1,7 @@
 # Runs anview once and compares what it wrote with a golden file.
 #   -DANVIEW=path  -DARGS=a;b;c  -DGOLDEN=file  -DOUTPUT=stdout|stderr|html
 #   -DHTML=file (OUTPUT html: where --html writes)  -DEXIT=expected exit status
+#   -DWORK_DIR=where to leave the actual output of a failed comparison
 # With the environment variable ANVIEW_UPDATE_GOLDEN set, the golden file is written
 # instead (review the difference before committing it).
 cmake_minimum_required(VERSION 3.25)
@@ -43,7 +44,7 @@ endif()
 file(READ ${GOLDEN} expected)
 if(NOT actual STREQUAL expected)
   get_filename_component(name ${GOLDEN} NAME)
-  set(saved ${CMAKE_CURRENT_BINARY_DIR}/${name}.actual)
+  set(saved ${WORK_DIR}/${name}.actual)
   file(WRITE ${saved} "${actual}")
   message(FATAL_ERROR "output differs from ${GOLDEN} (actual output in ${saved}):\n${actual}")
 endif()

@@ -356,9 +356,11 @@ AnnotationSet parseAnnotations(std::string_view text, const std::string &source)
             AnnoSpec spec = readAnnotation(anno, ++number, source);
             const auto [it, fresh] = tags.emplace(spec.tag, spec.number);
             if (!fresh) {
+                const bool given = anno.contains("tag");
                 throw Failure(source + ": annotation " + std::to_string(number) + ": tag " +
-                              std::to_string(spec.tag) + " is already used by annotation " +
-                              std::to_string(it->second));
+                              std::to_string(spec.tag) +
+                              (given ? "" : " (its number, the default)") +
+                              " is already used by annotation " + std::to_string(it->second));
             }
             set.annotations.push_back(std::move(spec));
         }

@@ -27,7 +27,12 @@ std::string readFile(const std::string &path) {
     if (!in) {
         throw anview::Failure(path + ": cannot open the file");
     }
-    std::string bytes((std::istreambuf_iterator<char>(in)), std::istreambuf_iterator<char>());
+    std::string bytes;
+    try {
+        bytes.assign(std::istreambuf_iterator<char>(in), std::istreambuf_iterator<char>());
+    } catch (const std::exception &) {
+        in.setstate(std::ios::badbit);  // a directory, or a read error
+    }
     if (in.bad()) {
         throw anview::Failure(path + ": cannot read the file");
     }
