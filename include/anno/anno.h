@@ -292,10 +292,14 @@ AN_API uint32_t ANSetCallback(DAHandle doc, ANCallback callback, void *callbackD
  * The descriptor (and a type-5 text) is only read. Range annotations are fitted to
  * the document's items and cut into pieces with cut markers. On success the
  * callback hears notification 1 once, with the normalised record.
- * Returns 15 (bad type, null descriptor, size not accepted, null doc), a DAGetAnno
- * failure, 18 (no state), 13 (out of memory or the table is full: the entry may
- * nevertheless be stored; no notification), for type 3 a failure of fitting it (the
- * pieces stored before stay), otherwise 0. */
+ * A type-1, 3 or 5 annotation with a non-zero userData hands that block over:
+ * ANClearUserData may free it.
+ * Returns 15 (bad type, null descriptor, size not accepted, null doc, a type-5 text
+ * of non-zero length at a null pointer, or a type-5/6 position inside annotation
+ * text that its anchor does not have: nothing added), a DAGetAnno failure, 18 (no
+ * state), 13 (out of memory or the table is full: the entry may nevertheless be
+ * stored; no notification), for type 3 a failure of fitting it (the pieces stored
+ * before stay), otherwise 0. */
 AN_API uint32_t ANAddAnno(DAHandle doc, uint16_t type, const void *descriptor);
 
 /* Removes the annotations of `doc` that `flags` and `value` select and announces
@@ -342,8 +346,9 @@ AN_API uint32_t ANIsAnnoTextPos(const ANPos *pos);
 AN_API uint32_t ANNextPos(DAHandle doc, const ANPos *pos, ANPos *next);
 
 /* Writes the next content position into `next` (zeroed first). A kind-5 position
- * steps to its anchor's content position without looking at `doc`. Returns 0, 15,
- * a DAGetAnno failure, 18, or 25 (unknown item or no further item). */
+ * steps to its anchor's content position without looking at `doc`. Returns 0, 15
+ * (null doc or pointer), a DAGetAnno failure, 18, or 25 (unknown item, no further
+ * item, or a failed step to the next character). */
 AN_API uint32_t ANNextChunkerPos(DAHandle doc, const ANPos *pos, ANPos *next);
 
 /* Writes the next annotation-text position into `next`. Returns 0, 15, a DAGetAnno
@@ -404,8 +409,8 @@ AN_API uint32_t ANEndAnnoTrack(DAHandle doc, ANTrackInfo *track);
  * with the details in *track. 0 before track->nextChange. Allocates nothing. */
 AN_API uint32_t ANTrackAnno(DAHandle doc, const ANPos *pos, ANTrackInfo *track);
 
-/* Prepares an annotation text track (one allocation). Returns 0 or 13 (the record is
- * then all zero). `doc` is not read. */
+/* Prepares an annotation text track (one allocation). Returns 0, 13 (the record is
+ * then all zero) or 15 (null track). `doc` is not read. */
 AN_API uint32_t ANStartAnnoTextTrack(DAHandle doc, ANAnnoTextTrack *track);
 
 /* Frees what a text track holds and zeroes it. Returns 0. `doc` is not read. */
@@ -416,13 +421,14 @@ AN_API uint32_t ANEndAnnoTextTrack(DAHandle doc, ANAnnoTextTrack *track);
 /* Delivers event `event` at `pos` to the annotations there, walking from slot
  * `entry` (AN_NONE for none), through the callback (notification 3). A move
  * (ANEVENT_MOVE) becomes leave and enter events against the previous move. Returns
- * the last callback result, or 0. */
+ * the last callback result, or 0. An `entry` that names no entry of the table
+ * delivers nothing, returns 0 and leaves the hover state alone. */
 AN_API uint32_t ANAnnoEvent(DAHandle doc, uint32_t event, uint16_t entry, const ANPos *pos);
 
 /* Reads the unit of annotation text at `pos` through the cache in `track`. Returns
  * 5 (a text unit in *unit), 6 (a placeholder, *unit 0), 25 (no text there), 15 (null
- * doc or a track not started), 13 (out of memory), 18 (no state), or a DAGetAnno
- * failure. */
+ * doc or pointer, or a track not started or already ended), 13 (out of memory: the
+ * units copied so far stay cached), 18 (no state), or a DAGetAnno failure. */
 AN_API uint32_t ANGetAnnoText(DAHandle doc, ANAnnoTextTrack *track, const ANPos *pos, uint16_t *unit);
 
 /* Searches the annotations as find->mode says and writes the found one's tag,

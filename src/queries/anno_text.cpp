@@ -2,13 +2,11 @@
 #include "anno/anno.h"
 #include "binding/instance.h"
 #include "positions/order.h"
+#include "queries/queries.h"
 #include "store/table.h"
 #include "tracking/text_track.h"
 
 namespace {
-
-constexpr uint32_t ANTEXT_UNIT_FOUND = 5;         // a unit of type-5 text
-constexpr uint32_t ANTEXT_PLACEHOLDER_FOUND = 6;  // the unit of a type-6 entry
 
 bool ANIsTextEntry(const ANEntry &entry) {
     return entry.type == AN_TYPE_TEXT || entry.type == AN_TYPE_PLACEHOLDER;

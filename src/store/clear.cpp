@@ -24,6 +24,8 @@ struct ANClearWalk {
     ANInstance *instance;
     ANEntryTable *table;
     uint16_t cursor;
+    uint16_t flags;  // the selection of the clear
+    uint32_t value;
 };
 
 bool ANIsTextType(uint16_t type) { return type == AN_TYPE_TEXT || type == AN_TYPE_PLACEHOLDER; }
@@ -70,30 +72,36 @@ struct ANTextCut {
     uint32_t offset;
     uint32_t length;
     ANPos collapse;
+    bool lastText;       // the removed entry was the last text at the anchor
+    uint16_t neighbour;  // the nearest text entry before it, or AN_NONE
 };
 
-void ANRenumberPos(ANPos &pos, const ANTextCut &cut) {
-    if (pos.kind != ANPOS_ANNOTEXT || !ANSameAnchor(pos, cut.anchor)) return;
-    if (pos.textIndex < cut.offset) return;
-    if (pos.textIndex - cut.offset >= cut.length) {
-        pos.textIndex -= cut.length;
-    } else {
+// Returns whether `pos` changed.
+bool ANRenumberPos(ANPos &pos, const ANTextCut &cut) {
+    if (pos.kind != ANPOS_ANNOTEXT || !ANSameAnchor(pos, cut.anchor)) return false;
+    if (pos.textIndex < cut.offset) return false;
+    const uint32_t past = pos.textIndex - cut.offset;
+    // After the last text at the anchor nothing is left behind `offset`: also an
+    // empty last entry hands its place to the text before it.
+    if (past < cut.length || (past == 0 && cut.lastText)) {
         pos = cut.collapse;
+    } else {
+        pos.textIndex -= cut.length;
     }
+    return true;
 }
 
-// Brings an entry whose extent the renumbering emptied or turned round back to a
-// valid one: a range that covers nothing goes, a point covers one step again.
-void ANRestoreExtent(ANClearWalk &walk, uint16_t index) {
-    ANAnnoRecord &record = ANSlot(walk.table, index).record;
-    const int16_t order = ANComparePos(record.start, record.end);
-    if (order < 0) return;
-    if (ANIsRangeType(ANSlot(walk.table, index).type)) {
-        ANDropEntry(walk, index);
-    } else if (order == 0) {
-        record.end = ANStepAfter(record.end);
-    } else {
-        record.end = ANStepAfter(record.start);
+// Brings an entry back to a valid extent after the renumbering. A range (or cut
+// marker) that covers nothing goes. A point keeps the one-step extent of its kind:
+// with its end collapsed onto the anchor while its start stayed in the text, it
+// would otherwise stretch over text inserted at the anchor later.
+void ANRestoreExtent(ANClearWalk &walk, uint16_t index, bool moved) {
+    ANEntry &entry = ANSlot(walk.table, index);
+    const bool empty = ANComparePos(entry.record.start, entry.record.end) >= 0;
+    if (ANIsRangeType(entry.type)) {
+        if (empty) ANDropEntry(walk, index);
+    } else if (empty || moved) {
+        entry.record.end = ANStepAfter(entry.record.start);
     }
 }
 
@@ -106,9 +114,15 @@ void ANRenumber(ANClearWalk &walk, const ANTextCut &cut) {
         ANEntry &entry = ANSlot(walk.table, index);
         if (ANStartPastAnchor(entry.record.start, cut.anchor)) break;
         const uint16_t next = entry.next;
-        ANRenumberPos(entry.record.start, cut);
-        ANRenumberPos(entry.record.end, cut);
-        ANRestoreExtent(walk, index);
+        // When the last text goes, the text entry nearest before it becomes the last.
+        // Text entries before an empty one share its start and stay where they are.
+        const ANPos &start = entry.record.start;
+        const bool staysInText = cut.lastText && index != cut.neighbour &&
+                                 ANIsTextType(entry.type) && start.kind == ANPOS_ANNOTEXT &&
+                                 ANSameAnchor(start, cut.anchor) && start.textIndex == cut.offset;
+        const bool startMoved = !staysInText && ANRenumberPos(entry.record.start, cut);
+        const bool endMoved = ANRenumberPos(entry.record.end, cut);
+        ANRestoreExtent(walk, index, startMoved || endMoved);
         index = next;
     }
 }
@@ -116,7 +130,7 @@ void ANRenumber(ANClearWalk &walk, const ANTextCut &cut) {
 // Appends the text of `after` to `before`, releases `after`, and gives `before` the
 // place `after` had: its positions, and a list position behind the annotations that
 // now lie inside its text. Out of memory leaves both texts as they are.
-uint32_t ANJoinTexts(ANClearWalk &walk, uint16_t before, uint16_t after, uint32_t offset) {
+uint32_t ANJoinTexts(ANClearWalk &walk, uint16_t before, uint16_t after) {
     ANEntryTable *table = walk.table;
     ANAnnoRecord &kept = ANSlot(table, before).record;
     ANAnnoRecord &gone = ANSlot(table, after).record;
@@ -136,20 +150,14 @@ uint32_t ANJoinTexts(ANClearWalk &walk, uint16_t before, uint16_t after, uint32_
                     gone.textLength * sizeof(uint16_t));
     }
     kept.textLength = static_cast<uint32_t>(total);
-    const uint32_t goneLength = gone.textLength;
     kept.start = gone.start;
     kept.end = gone.end;
-    const ANPos anchor = kept.start;
     ANDropEntry(walk, after);
 
-    const uint32_t limit = offset + goneLength;
+    // The annotations on the units that `before` took over now lie inside its text:
+    // they, and any position left on the removed unit, go in front of it.
     uint16_t index = ANSlot(table, before).next;
-    while (index != AN_NONE) {
-        const ANPos &start = ANSlot(table, index).record.start;
-        if (start.kind != ANPOS_ANNOTEXT || !ANSameAnchor(start, anchor) ||
-            start.textIndex >= limit) {
-            break;
-        }
+    while (index != AN_NONE && ANPosBefore(ANSlot(table, index).record.start, kept.start)) {
         const uint16_t next = ANSlot(table, index).next;
         ANListRemove(table, index);
         ANListInsertAfter(table, index, ANSlot(table, before).prev);
@@ -164,24 +172,31 @@ uint32_t ANFixText(ANClearWalk &walk, uint16_t removed) {
     ANEntryTable *table = walk.table;
     const ANEntry &entry = ANSlot(table, removed);
     const ANPos anchor = entry.record.start;
+    // The anchor's text spans the list from its first unit to its content position.
+    // Entries of other anchors can lie in between (those on the item itself, when the
+    // anchor is character 0 of a text item); only the anchor's own text counts.
+    const ANPos textBegin{anchor.itemId, anchor.subItemId, ANPOS_ANNOTEXT, 0};
+    const ANPos content{anchor.itemId, anchor.subItemId, 0, 0};
 
     uint32_t offset = 0;
-    uint16_t before = AN_NONE;
-    bool textSeen = false;
+    uint16_t neighbour = AN_NONE;
     for (uint16_t i = entry.prev;
-         i != AN_NONE && ANSameAnchor(ANSlot(table, i).record.start, anchor);
+         i != AN_NONE && !ANPosBefore(ANSlot(table, i).record.start, textBegin);
          i = ANSlot(table, i).prev) {
         const ANEntry &other = ANSlot(table, i);
-        if (!ANIsTextType(other.type)) continue;
+        if (!ANIsTextType(other.type) || !ANSameAnchor(other.record.start, anchor)) continue;
         offset += ANTextUnits(other);
-        if (!textSeen && other.type == AN_TYPE_TEXT) before = i;
-        textSeen = true;
+        if (neighbour == AN_NONE) neighbour = i;
     }
+    // Only text (not a placeholder) right before the removed entry can take a join.
+    const uint16_t before =
+        neighbour != AN_NONE && ANSlot(table, neighbour).type == AN_TYPE_TEXT ? neighbour : AN_NONE;
 
     uint16_t after = AN_NONE;
     for (uint16_t i = entry.next;
-         i != AN_NONE && ANSameAnchor(ANSlot(table, i).record.start, anchor);
+         i != AN_NONE && ANPosAtOrBefore(ANSlot(table, i).record.start, content);
          i = ANSlot(table, i).next) {
+        if (!ANSameAnchor(ANSlot(table, i).record.start, anchor)) continue;
         const uint16_t type = ANSlot(table, i).type;
         if (type == AN_TYPE_PLACEHOLDER) break;
         if (type == AN_TYPE_TEXT) {
@@ -190,19 +205,26 @@ uint32_t ANFixText(ANClearWalk &walk, uint16_t removed) {
         }
     }
 
-    ANTextCut cut{anchor, offset, ANTextUnits(entry), {}};
+    ANTextCut cut{anchor, offset, ANTextUnits(entry), {}, anchor.kind != ANPOS_ANNOTEXT, neighbour};
     if (anchor.kind == ANPOS_ANNOTEXT) {
         // Not the last text at the anchor: its units now begin where the removed ones did.
         cut.collapse = ANPos{anchor.itemId, anchor.subItemId, ANPOS_ANNOTEXT, offset};
     } else {
-        cut.collapse = ANPos{anchor.itemId, anchor.subItemId, 0, 0};
+        cut.collapse = content;
     }
     ANRenumber(walk, cut);
 
-    if (entry.type != AN_TYPE_PLACEHOLDER || before == AN_NONE || after == AN_NONE) {
-        return kStatusOk;
+    uint32_t status = kStatusOk;
+    // A later text that this clear selects is removed, and announced, in its turn;
+    // joined, its text would outlive the clear under another entry's tag.
+    if (entry.type == AN_TYPE_PLACEHOLDER && before != AN_NONE && after != AN_NONE &&
+        !ANIsSelected(ANSlot(table, after).record.tag, walk.flags, walk.value)) {
+        status = ANJoinTexts(walk, before, after);
     }
-    return ANJoinTexts(walk, before, after, offset);
+    // Positions collapsed onto a character's content position can pass entries on
+    // the item itself, whose text at character 0 interleaves with the item's.
+    ANRestoreOrder(table, anchor);
+    return status;
 }
 
 // Removes a selected entry and announces it. Returns the new status of the clear.
@@ -256,7 +278,7 @@ extern "C" AN_API uint32_t ANClearAnnos(DAHandle doc, uint16_t flags, uint32_t v
     ANEntryTable *table = instance->entries;
     if (table == nullptr) return AN_OK;
 
-    ANClearWalk walk{instance, table, table->first};
+    ANClearWalk walk{instance, table, table->first, flags, value};
     uint32_t status = kStatusOk;
     while (walk.cursor != AN_NONE) {
         const uint16_t index = walk.cursor;

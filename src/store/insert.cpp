@@ -120,7 +120,7 @@ uint32_t GrowBeforeInsert(ANInstance *instance) {
     return ANGrowTable(&instance->entries);
 }
 
-// Step 5: a range touching or overlapping the type-3 entry just before or after its
+// A range touching or overlapping the type-3 entry just before or after its
 // place extends that entry instead of being stored. True when merged.
 bool MergeRange(ANEntryTable *table, uint16_t prev, uint16_t next, const ANAnnoRecord &record) {
     bool merged = false;
@@ -154,7 +154,7 @@ bool MergeRange(ANEntryTable *table, uint16_t prev, uint16_t next, const ANAnnoR
 
 // The annotation text around the place of new text at its anchor.
 struct TextAround {
-    uint32_t before = 0;             // units of the text entries before the place
+    uint64_t before = 0;             // units of the text entries before the place
     uint64_t after = 0;              // units of the text entries after the place
     uint16_t mergeTarget = AN_NONE;  // the nearest text entry before, when it has type 5
     uint16_t following = AN_NONE;    // the type-5 entry next after, unless a placeholder is first
@@ -196,7 +196,7 @@ bool TextIndexInside(const ANEntryTable *table, const TextAround &around, uint32
     return k - around.before <= ANSlot(table, around.following).record.textLength;
 }
 
-// Step 4: moves the text positions of the entries around new text of `width` units
+// Moves the text positions of the entries around new text of `width` units
 // that goes in at record.start (b = units already before it at the anchor), and
 // the record's own text positions.
 void ShiftTextPositions(ANEntryTable *table, uint16_t type, ANAnnoRecord *record, uint32_t b,
@@ -227,9 +227,14 @@ void ShiftTextPositions(ANEntryTable *table, uint16_t type, ANAnnoRecord *record
             }
         } else {
             if (HasExtent(entry.type) && ANPosEqual(end, anchor)) {
-                // A range that ended at the anchor now ends where the new text begins.
-                end.kind = ANPOS_ANNOTEXT;
-                end.textIndex = b;
+                // A range that ended at the anchor now ends where the new text begins,
+                // unless that would put its end before its start: an empty range at the
+                // anchor, or one from an item to its first character, whose text sorts
+                // before the item itself. Those keep their end and cover no new text.
+                ANPos moved = end;
+                moved.kind = ANPOS_ANNOTEXT;
+                moved.textIndex = b;
+                if (ANPosAtOrBefore(start, moved)) end = moved;
             }
             const bool bothText = entry.type == AN_TYPE_TEXT && type == AN_TYPE_TEXT;
             if (!HasExtent(entry.type) && !bothText && ANPosEqual(start, anchor)) {
@@ -245,7 +250,7 @@ void ShiftTextPositions(ANEntryTable *table, uint16_t type, ANAnnoRecord *record
     if (record->end.kind == ANPOS_ANNOTEXT) record->end.textIndex += width;
 }
 
-// Step 6: a placeholder that goes inside the text of the following entry X splits
+// A placeholder that goes inside the text of the following entry X splits
 // it; the units before it move to a new type-5 entry S linked in at the place,
 // which becomes the placeholder's `prev`. S stands for the same annotation as X:
 // it takes X's tag, userData, value and flags, so clearing by tag treats both
@@ -279,7 +284,7 @@ uint32_t SplitText(ANInstance *instance, uint16_t *prev, uint16_t following, uin
     return LinkNewEntry(instance, *prev, AN_TYPE_TEXT, split, x.flags, prev);
 }
 
-// Step 7: stores new text into the merge target, into the following text entry,
+// Stores new text into the merge target, into the following text entry,
 // or into the record's own buffer for a new entry (*stored false).
 uint32_t StoreText(ANEntryTable *table, ANAnnoRecord *record, const TextAround &around,
                    bool *stored) {
@@ -320,7 +325,7 @@ uint32_t StoreText(ANEntryTable *table, ANAnnoRecord *record, const TextAround &
     return OwnTextCopy(record);
 }
 
-// Steps 3 to 8 for a document that has a table.
+// Inserting into a document that has a table: the place, then by type.
 uint32_t InsertIntoTable(ANInstance *instance, uint16_t type, ANAnnoRecord *record, uint32_t mode,
                          uint16_t flags) {
     if (instance->entries->full != 0) return AN_ERR_NOMEM;
@@ -349,17 +354,18 @@ uint32_t InsertIntoTable(ANInstance *instance, uint16_t type, ANAnnoRecord *reco
         !TextIndexInside(table, around, record->start.textIndex)) {
         return AN_ERR_BADARG;
     }
-    if (static_cast<uint64_t>(around.before) + around.after + width > UINT32_MAX) {
+    if (around.before + around.after + width > UINT32_MAX) {
         return AN_ERR_NOMEM;  // the anchor's text would outgrow its 32-bit indices
     }
+    const auto before = static_cast<uint32_t>(around.before);
     table->hasText = 1;
-    if (mode == ANINSERT_ADD) ShiftTextPositions(table, type, record, around.before, width);
+    if (mode == ANINSERT_ADD) ShiftTextPositions(table, type, record, before, width);
 
     uint32_t rc = AN_OK;
     if (type == AN_TYPE_PLACEHOLDER) {
         if (mode == ANINSERT_ADD && around.following != AN_NONE &&
             record->start.textIndex > around.before + 1) {
-            rc = SplitText(instance, &prev, around.following, around.before, *record);
+            rc = SplitText(instance, &prev, around.following, before, *record);
         }
     } else {
         bool stored = false;
@@ -389,8 +395,7 @@ uint32_t ANInsertEntry(ANInstance *instance, uint16_t type, ANAnnoRecord *record
         record->textBuffer = nullptr;
     }
     if (type == AN_TYPE_TEXT && record->text == nullptr && record->textLength != 0) {
-        if (fromBuffer) record->text = savedText;
-        return AN_ERR_BADARG;
+        return AN_ERR_BADARG;  // (never with a buffer, which is not null)
     }
 
     uint32_t rc = AN_OK;

@@ -148,6 +148,7 @@ TEST_F(ClearAnnosTest, ReturnsTheLastCallbackResultAndZeroWhenNothingIsRemoved) 
         EXPECT_EQ(ANClearAnnos(doc, ANCLEAR_EQUAL, 3), c.expected);
         EXPECT_EQ(recorder.calls.size(), 2u) << "a callback result does not stop the walk";
         EXPECT_EQ(Tags(doc), std::vector<uint32_t>{4});
+        EXPECT_TRUE(StoreHolds(doc));
     }
 }
 
@@ -178,6 +179,7 @@ TEST_F(ClearAnnosTest, CallbackSeesTheRemovedEntryAlreadyOutOfTheTable) {
     EXPECT_EQ(call.record.style, 9u);
     EXPECT_TRUE(call.slotFree);
     EXPECT_EQ(call.countAtCall, 1);
+    EXPECT_TRUE(StoreHolds(doc));
 }
 
 TEST_F(ClearAnnosTest, RemovingTheHoveredEntryResetsTheHoverState) {
@@ -193,6 +195,7 @@ TEST_F(ClearAnnosTest, RemovingTheHoveredEntryResetsTheHoverState) {
     EXPECT_EQ(state->hoverEntry, AN_NONE);
     EXPECT_EQ(state->hoverPos.itemId, kNo);
     EXPECT_EQ(state->hoverPos.subItemId, kNo);
+    EXPECT_TRUE(StoreHolds(doc));
 }
 
 // ---- Annotation text ------------------------------------------------------------
@@ -333,6 +336,104 @@ TEST_F(ClearAnnosTest, TextAtACharacterIsRenumberedPastAnnotationsOnItsItem) {
     EXPECT_TRUE(StoreHolds(doc));
 }
 
+TEST_F(ClearAnnosTest, TextAtCharacterZeroIsFoundPastAnnotationsOnItsItem) {
+    // Text at a text item's character 0 sorts before the item itself, its content
+    // position after it: annotations on the item lie between the two in the list.
+    uint32_t textItem = 0;
+    auto build = [&](const char *name) {
+        antk::DocumentBuilder builder;
+        textItem = builder.textItem("xyz");
+        builder.item(antk::kItemParagraph);
+        EXPECT_EQ(builder.charIds(textItem)[0], 0u) << name;
+        return builder.build();
+    };
+    auto annotate = [&](Doc &doc) {
+        const ANPos anchor = Pos(textItem, 0);
+        ASSERT_EQ(ANInit(doc, nullptr, nullptr, nullptr), AN_OK);
+        ASSERT_EQ(AddText(doc, anchor, u"ab", 1), AN_OK);
+        ASSERT_EQ(AddPlaceholder(doc, anchor, 2), AN_OK);
+        ASSERT_EQ(AddText(doc, anchor, u"cd", 3), AN_OK);
+        ASSERT_EQ(AddPoint(doc, TextPos(textItem, 0, 1), 4), AN_OK);  // on 'b'
+        ASSERT_EQ(AddPoint(doc, TextPos(textItem, 0, 4), 6), AN_OK);  // on 'd'
+        ASSERT_EQ(AddHilite(doc, Pos(textItem), Pos(textItem + 1), 5), AN_OK);
+        ASSERT_EQ(Tags(doc), (std::vector<uint32_t>{4, 1, 2, 6, 5, 3}));
+    };
+    {
+        Doc doc(build("last text removed"));
+        annotate(doc);
+        const ANPos anchor = Pos(textItem, 0);
+        ASSERT_EQ(ANClearAnnos(doc, ANCLEAR_EQUAL, 3), AN_OK);
+        EXPECT_EQ(AnchorText(doc, anchor), u"ab#");
+        const auto list = ListedEntries(doc);
+        EXPECT_EQ(Tagged(list, 2)->record.start, anchor) << "the placeholder is now last";
+        EXPECT_EQ(Tagged(list, 1)->record.start, TextPos(textItem, 0, 2));
+        EXPECT_EQ(Tagged(list, 6)->record.start, anchor);
+        EXPECT_TRUE(StoreHolds(doc));
+    }
+    {
+        Doc doc(build("placeholder removed"));
+        annotate(doc);
+        const ANPos anchor = Pos(textItem, 0);
+        ASSERT_EQ(ANClearAnnos(doc, ANCLEAR_EQUAL, 2), AN_OK);
+        EXPECT_EQ(AnchorText(doc, anchor), u"abcd");
+        const auto list = ListedEntries(doc);
+        EXPECT_EQ(Tagged(list, 3), nullptr) << "joined";
+        EXPECT_EQ(Tagged(list, 1)->record.start, anchor);
+        EXPECT_EQ(Tagged(list, 6)->record.start, TextPos(textItem, 0, 3));
+        EXPECT_EQ(Tags(doc), (std::vector<uint32_t>{4, 6, 5, 1}));
+        EXPECT_TRUE(StoreHolds(doc));
+    }
+}
+
+TEST_F(ClearAnnosTest, EmptyTextEntriesKeepTheLayout) {
+    // "abc", a placeholder, and an empty last text of the same tag: what splitting a
+    // text at its very end leaves.
+    auto split = [](Doc &doc) {
+        ASSERT_EQ(AddText(doc, kAnchor, u"abc", 1), AN_OK);
+        ASSERT_EQ(AddPlaceholder(doc, kAnchor, 2), AN_OK);
+        ASSERT_EQ(AddText(doc, kAnchor, u"d", 1), AN_OK);
+        ANEntryTable *table = MutableTable(doc);
+        ANSlot(table, table->last).record.textLength = 0;
+        ASSERT_TRUE(StoreHolds(doc));
+    };
+    {
+        Doc doc(NewDoc());
+        split(doc);
+        ASSERT_EQ(AddPlaceholder(doc, kAnchor, 3), AN_OK);
+        ASSERT_EQ(AddPoint(doc, TextPos(1, kNo, 3), 4), AN_OK);
+        ASSERT_TRUE(StoreHolds(doc));
+        ASSERT_EQ(ANClearAnnos(doc, ANCLEAR_EQUAL, 3), AN_OK);
+        EXPECT_EQ(AnchorText(doc, kAnchor), u"abc#");
+        const auto list = ListedEntries(doc);
+        EXPECT_EQ(Tagged(list, 2)->record.start, TextPos(1, kNo, 4))
+            << "the placeholder keeps its place; the empty text behind it is last";
+        EXPECT_EQ(list.back().record.start, kAnchor);
+        EXPECT_TRUE(StoreHolds(doc));
+    }
+    {
+        Doc doc(NewDoc());
+        split(doc);
+        ASSERT_EQ(AddHilite(doc, TextPos(1, kNo, 3), Pos(3), 5), AN_OK);  // from the placeholder
+        ASSERT_EQ(ANClearAnnos(doc, ANCLEAR_EQUAL, 2), AN_OK);
+        EXPECT_EQ(AnchorText(doc, kAnchor), u"abc");
+        EXPECT_EQ(Tags(doc), (std::vector<uint32_t>{5, 1})) << "joined with the empty text";
+        EXPECT_EQ(ListedEntries(doc).back().record.start, kAnchor);
+        EXPECT_TRUE(StoreHolds(doc));
+    }
+    {
+        // Both halves share the tag; the empty one goes last and leaves the
+        // placeholder as the last text.
+        Doc doc(NewDoc());
+        split(doc);
+        ASSERT_EQ(ANClearAnnos(doc, ANCLEAR_EQUAL, 1), AN_OK);
+        const auto list = ListedEntries(doc);
+        ASSERT_EQ(list.size(), 1u);
+        EXPECT_EQ(list[0].record.start, kAnchor);
+        EXPECT_EQ(list[0].record.end, kAfterAnchor);
+        EXPECT_TRUE(StoreHolds(doc));
+    }
+}
+
 // ---- Joining two texts ------------------------------------------------------------
 
 TEST_F(ClearAnnosTest, RemovedPlaceholderJoinsTheTextsAroundIt) {
@@ -410,11 +511,11 @@ TEST_F(ClearAnnosTest, JoinGrowsTheBufferInStepsOfSixtyFourUnits) {
 
 TEST_F(ClearAnnosTest, WalkGoesOnAfterAnEntryReleasedWithTheRemovedOne) {
     Doc doc(NewDoc());
-    // The later text follows the placeholder directly and is selected too: the join
-    // takes it, and the walk must go on behind it.
+    // The later text follows the placeholder directly: the join takes it, and the
+    // walk must go on behind it.
     ASSERT_EQ(AddText(doc, kAnchor, u"ab", 1), AN_OK);
     ASSERT_EQ(AddPlaceholder(doc, kAnchor, 2), AN_OK);
-    ASSERT_EQ(AddText(doc, kAnchor, u"cd", 2), AN_OK);
+    ASSERT_EQ(AddText(doc, kAnchor, u"cd", 3), AN_OK);
     ASSERT_EQ(AddPoint(doc, Pos(2), 2), AN_OK);
     ASSERT_EQ(AddPoint(doc, Pos(3), 3), AN_OK);
     // A highlight covering nothing, right behind a removed last text, is released by
@@ -435,6 +536,26 @@ TEST_F(ClearAnnosTest, WalkGoesOnAfterAnEntryReleasedWithTheRemovedOne) {
     ASSERT_EQ(ANClearAnnos(doc, ANCLEAR_EQUAL, 4), AN_OK);
     EXPECT_EQ(recorder.RemovedTags(), (std::vector<uint32_t>{2, 2, 4, 4}));
     EXPECT_EQ(Tags(doc), (std::vector<uint32_t>{1, 3, 6}));
+    EXPECT_TRUE(StoreHolds(doc));
+}
+
+TEST_F(ClearAnnosTest, LaterTextThatTheClearSelectsIsRemovedInItsTurnNotJoined) {
+    Doc doc(NewDoc());
+    ASSERT_EQ(AddText(doc, kAnchor, u"ab", 1), AN_OK);
+    ASSERT_EQ(AddPlaceholder(doc, kAnchor, 2), AN_OK);
+    ASSERT_EQ(AddText(doc, kAnchor, u"cd", 2), AN_OK);
+    ASSERT_EQ(AddPoint(doc, TextPos(1, kNo, 3), 3), AN_OK);  // on 'c'
+    Recorder recorder;
+    recorder.Listen(doc);
+
+    ASSERT_EQ(ANClearAnnos(doc, ANCLEAR_EQUAL, 2), AN_OK);
+    EXPECT_EQ(recorder.RemovedTags(), (std::vector<uint32_t>{2, 2}));
+    ASSERT_EQ(recorder.calls.size(), 2u);
+    EXPECT_EQ(recorder.calls[1].type, AN_TYPE_TEXT);
+    EXPECT_EQ(AnchorText(doc, kAnchor), u"ab") << "no text of tag 2 outlives the clear";
+    const auto list = ListedEntries(doc);
+    EXPECT_EQ(Tagged(list, 1)->record.start, kAnchor);
+    EXPECT_EQ(Tagged(list, 3)->record.start, kAnchor) << "collapsed with its text";
     EXPECT_TRUE(StoreHolds(doc));
 }
 
@@ -491,6 +612,7 @@ TEST_F(ClearAnnosTest, JoinOutOfMemoryReportsThirteenAndLeavesTheTextsApart) {
         EXPECT_EQ(ANClearAnnos(doc, ANCLEAR_EQUAL, 2), 7u);
         anwin::clearFailures();
         EXPECT_EQ(ListedEntries(doc).size(), 3u);
+        EXPECT_TRUE(StoreHolds(doc));
     }
 #endif
 }

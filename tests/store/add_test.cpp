@@ -290,14 +290,6 @@ TEST_F(AddTest, BadTypesNullPointersAndDocumentsWithoutStateAreRefused) {
     EXPECT_EQ(TableOf(doc), nullptr);
 }
 
-TEST_F(AddTest, EmptyTextIsStoredAsAnEntryWithoutUnits) {
-    const Added added =
-        AddToFreshDocument(AN_TYPE_TEXT, Descriptor(48).Put(8, Pos(1)).Put(40, 0u).data());
-    EXPECT_EQ(added.rc, AN_OK);
-    ASSERT_EQ(added.entries.size(), 1u);
-    EXPECT_EQ(added.entries[0].record.textLength, 0u);
-}
-
 TEST_F(AddTest, HiliteGivenBackwardsIsStoredAndAnnouncedInOrder) {
     const Stored s = AddAccepted(AN_TYPE_HILITE, Descriptor(72).Put(8, kB).Put(24, kA));
     EXPECT_EQ(s.entry.record.start, kA);

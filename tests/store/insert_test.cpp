@@ -64,6 +64,30 @@ TEST_F(InsertTest, FirstTextAtAContentPositionIsOneEntryAtThatPosition) {
     EXPECT_EQ(listed[0].record.text, nullptr);
 }
 
+// A range's end moves into text inserted where it ends only when its start stays at
+// or before it.
+TEST_F(InsertTest, RangesEndingWhereTextGoesInNeverEndBeforeTheyStart) {
+    antk::DocumentBuilder builder;
+    builder.item(1);
+    const uint32_t textItem = builder.textItem("abc");
+    Doc doc(builder.build());
+    ASSERT_EQ(ANInit(doc, nullptr, nullptr, nullptr), AN_OK);
+    const uint32_t firstChar = antk::items(doc)[1].firstChar;
+
+    ADD_OK(AddHilite(doc, Pos(0), Pos(0), 1));                           // empty, at item 0
+    ADD_OK(AddHilite(doc, Pos(textItem), Pos(textItem, firstChar), 2));  // item to its 1st char
+    ADD_OK(AddText(doc, Pos(0), u"xy", 3));
+    ADD_OK(AddText(doc, Pos(textItem, firstChar), u"z", 4));
+    EXPECT_TRUE(annotest::TableInvariantsHold(doc));
+    const auto listed = ListedEntries(doc);
+    EXPECT_EQ(ByTag(listed, 1).record.end, Pos(0)) << "an empty range stays empty";
+    EXPECT_EQ(ByTag(listed, 2).record.end, Pos(textItem, firstChar))
+        << "text at the first character sorts before the item: the end stays";
+    for (const Listed &e : listed) {
+        EXPECT_LE(ANCompPos(&e.record.start, &e.record.end), 0) << "tag " << e.record.tag;
+    }
+}
+
 TEST_F(InsertTest, TextBufferGrowsInStepsOf64AboveItsLength) {
     Doc doc(NewDoc());
     ADD_OK(AddText(doc, Pos(2), std::u16string(64, u'a')));
@@ -316,14 +340,6 @@ TEST_F(InsertTest, TextPositionsOutsideTheAnnotationTextAreRefused) {
     EXPECT_EQ(AnchorText(doc, Pos(2)), u"abc#");
     ADD_OK(AddText(doc, TextPos(2, kNo, 3), u"x"));
     EXPECT_EQ(AnchorText(doc, Pos(2)), u"abcx#");
-}
-
-TEST_F(InsertTest, PointsAndRangesMayUseTextPositionsOfTheirOwn) {
-    Doc doc(NewDoc());
-    ADD_OK(AddPoint(doc, TextPos(7, 3, 9), 1));
-    ADD_OK(AddHilite(doc, TextPos(7, 3, 2), TextPos(7, 3, 4), 2));
-    EXPECT_EQ(TableOf(doc)->count, 2);
-    EXPECT_EQ(TableOf(doc)->hasText, 0u);
 }
 
 }  // namespace

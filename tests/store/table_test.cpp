@@ -129,7 +129,20 @@ TEST_F(TableTest, RepeatedGrowthFailureRefusesWithoutTakingTheLastSlot) {
 #endif
 }
 
+#if defined(__SANITIZE_ADDRESS__)
+#define ANNO_SLOW_REALLOC 1
+#elif defined(__has_feature)
+#if __has_feature(address_sanitizer)
+#define ANNO_SLOW_REALLOC 1
+#endif
+#endif
+
 TEST_F(TableTest, LimitOf65529EntriesSetsFullAndRefusesEveryFurtherInsertion) {
+#if defined(ANNO_SLOW_REALLOC)
+    // 6553 growths copy some 20 GB under the address sanitizer's allocator; the
+    // growth itself is covered by the other tests there.
+    GTEST_SKIP() << "too slow with the address sanitizer";
+#endif
     Doc doc(annotest::PlainDocument(1));
     ASSERT_EQ(ANInit(doc, nullptr, nullptr, nullptr), AN_OK);
     constexpr uint32_t kMaxEntries = 65529;
