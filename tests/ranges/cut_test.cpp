@@ -109,6 +109,18 @@ TEST_F(CutTest, PiecesEndBeforeTheSkippedItemsInFrontOfACut) {
 }
 
 // A placeholder added later puts a cut position inside an existing range.
+TEST_F(CutTest, LastPieceStartsPastSkippedItemsAndMarkers) {
+    Doc doc(NewDoc("....cS...."));
+    ADD_OK(AddRange(doc, Pos(1), Pos(8)));
+    EXPECT_EQ(StoredEntries(doc), (std::vector<Stored>{Range(1, 4), Mark(4), Range(6, 8)}));
+
+    Doc marked(NewDoc("....c....."));
+    ADD_OK(AddCutMark(marked, Pos(5)));
+    ADD_OK(AddRange(marked, Pos(1), Pos(8)));
+    EXPECT_EQ(StoredEntries(marked),
+              (std::vector<Stored>{Range(1, 4), Mark(4), Mark(5), Range(6, 8)}));
+}
+
 TEST_F(CutTest, CutsInsideExistingRangesAreNotExaminedAndTheRangesMerge) {
     Doc doc(NewDoc(".........."));
     ADD_OK(AddRange(doc, Pos(3), Pos(6)));
