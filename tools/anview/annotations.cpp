@@ -210,8 +210,9 @@ uint32_t eventMask(const Fields &fields) {
     }
     uint32_t mask = 0;
     for (const Json &event : fields.array("events")) {
+        const std::string name = event.is_string() ? event.get<std::string>() : std::string();
         const auto *found = std::find_if(std::begin(kEventNames), std::end(kEventNames),
-                                         [&](const EventName &e) { return event == e.name; });
+                                         [&](const EventName &e) { return name == e.name; });
         if (found == std::end(kEventNames)) {
             fields.fail("\"events\": " + event.dump() +
                         " is not one of \"click1\", \"click2\", \"click3\", \"enter\", \"leave\"");

@@ -210,9 +210,18 @@ void renderLegend(const Page &page, std::ostream &out, bool colour) {
             key = colour ? sgr(colourKey.look) + " " + colourKey.letter + " " + kReset + " "
                          : std::string(1, colourKey.letter) + "  ";
         }
-        std::string text = "  " + padded("[" + std::to_string(line.number) + "]", numberWidth) +
-                           "  " + padded(line.kind, kindWidth) + "  " +
-                           padded(line.where, whereWidth) + "  " + key + line.detail;
+        std::string number = "[";
+        number += std::to_string(line.number);
+        number += ']';
+        std::string text = "  ";
+        text += padded(number, numberWidth);
+        text += "  ";
+        text += padded(line.kind, kindWidth);
+        text += "  ";
+        text += padded(line.where, whereWidth);
+        text += "  ";
+        text += key;
+        text += line.detail;
         if (!line.label.empty()) {
             text += "  \"" + line.label + "\"";
         }
