@@ -179,22 +179,28 @@ std::map<std::string, uint64_t> CallsByFunction() {
 }
 
 struct RunControl {
-    Fault fault = Fault::Allocation;
-    uint64_t n = 0;  // 0: nothing armed
-    bool persistent = false;
+    Failure failure;
     const Reference *ref = nullptr;
     Reference *record = nullptr;  // filled by the reference run
     const StepProbe *probe = nullptr;
 };
 
-std::string Describe(const Scenario &s, const RunControl &ctl) {
+std::string Describe(const Scenario &s, const Failure &f) {
     std::ostringstream out;
     out << "scenario '" << s.name << "'";
-    if (ctl.n != 0) {
-        out << ", " << (ctl.fault == Fault::Allocation ? "allocation " : "module call ") << ctl.n
-            << (ctl.persistent ? " and every later one" : " alone") << " failing";
+    if (f.n != 0) {
+        out << ", " << (f.fault == Fault::Allocation ? "allocation " : "module call ") << f.n;
+        if (!f.function.empty()) out << " of " << f.function;
+        out << (f.persistent ? " and every later one" : " alone") << " failing";
     }
     return out.str();
+}
+
+antk::Fn FunctionNamed(const std::string &name) {
+    for (int f = 0; f < static_cast<int>(antk::Fn::Count); ++f) {
+        if (name == antk::fnName(static_cast<antk::Fn>(f))) return static_cast<antk::Fn>(f);
+    }
+    return antk::Fn::Count;
 }
 
 void CheckWorld(const World &w, const std::string &where) {
@@ -237,7 +243,8 @@ void TearDownWorld(World &w, int64_t heapAtStart, int64_t globalAtStart, const s
 }
 
 void RunOnce(const Scenario &s, const RunControl &ctl) {
-    const std::string where = Describe(s, ctl);
+    const Failure &f = ctl.failure;
+    const std::string where = Describe(s, f);
     const int64_t heapAtStart = anwin::heapBlocks();
     const int64_t globalAtStart = anwin::globalBlocks();
     World w;
@@ -248,15 +255,21 @@ void RunOnce(const Scenario &s, const RunControl &ctl) {
     anwin::resetCounters();
     antk::resetCalls();
     size_t hitStep = s.steps.size();
-    if (ctl.n != 0) {
+    if (f.n != 0) {
         uint64_t within = 0;
-        hitStep = StepOf(*ctl.ref, ctl.fault, ctl.n, &within);
-        if (ctl.fault == Fault::Allocation) {
-            anwin::failAllocation(ctl.n, ctl.persistent);
+        hitStep = StepOf(*ctl.ref, f, &within);
+        if (f.fault == Fault::Allocation) {
+            anwin::failAllocation(f.n, f.persistent);
+        } else if (f.function.empty()) {
+            antk::failAnyCall(f.n, kModuleCode, f.persistent);
         } else {
-            antk::failAnyCall(ctl.n, kModuleCode, ctl.persistent);
+            antk::failCall(FunctionNamed(f.function), f.n, kModuleCode, f.persistent);
         }
     }
+    // A module's code may come back only from the calls that pass it on, and only
+    // when a function whose code is passed on failed.
+    const bool moduleCodeAllowed =
+        f.fault == Fault::ModuleCall && (f.function.empty() || PassesOnItsCode(f.function));
 
     for (size_t i = 0; i < s.steps.size(); ++i) {
         const Step &step = s.steps[i];
@@ -282,13 +295,12 @@ void RunOnce(const Scenario &s, const RunControl &ctl) {
         } else if (i < hitStep) {
             EXPECT_EQ(rc, ctl.ref->results[i]) << at << ": before any failure";
         } else {
-            Codes allowed = step.codes;
-            const bool moduleCodeAllowed = ctl.fault == Fault::ModuleCall;
             const bool ok = rc == ctl.ref->results[i] ||
-                            ((rc != kModuleCode || moduleCodeAllowed) && allowed.contains(rc));
+                            ((rc != kModuleCode || moduleCodeAllowed) && step.codes.contains(rc));
             EXPECT_TRUE(ok) << at << ": gives " << rc << "; may give " << ctl.ref->results[i]
-                            << " or " << allowed.str();
-            if (i == hitStep && ctl.fault == Fault::Allocation && !step.outOfMemory.empty()) {
+                            << " or " << step.codes.str()
+                            << (moduleCodeAllowed ? "" : " without the module's code");
+            if (i == hitStep && f.fault == Fault::Allocation && !step.outOfMemory.empty()) {
                 EXPECT_TRUE(step.outOfMemory.contains(rc))
                     << at << ": out of memory gives " << rc << "; expected "
                     << step.outOfMemory.str();
@@ -312,12 +324,29 @@ void RunOnce(const Scenario &s, const RunControl &ctl) {
 
 }  // namespace
 
-size_t StepOf(const Reference &ref, Fault fault, uint64_t n, uint64_t *within) {
-    const std::vector<uint64_t> &before =
-        fault == Fault::Allocation ? ref.allocationsBefore : ref.callsBefore;
+bool PassesOnItsCode(const std::string &function) {
+    return function == "DAGetAnno" || function == "DARetrieveDocHandle" ||
+           function == "DALockModuleData" || function == "DAGetHChunker";
+}
+
+size_t StepOf(const Reference &ref, const Failure &failure, uint64_t *within) {
+    std::vector<uint64_t> before;
+    if (failure.fault == Fault::Allocation) {
+        before = ref.allocationsBefore;
+    } else if (failure.function.empty()) {
+        before = ref.callsBefore;
+    } else {
+        uint64_t sum = 0;
+        for (const auto &step : ref.perStepFunction) {
+            before.push_back(sum);
+            const auto it = step.find(failure.function);
+            if (it != step.end()) sum += it->second;
+        }
+        before.push_back(sum);
+    }
     for (size_t i = 0; i + 1 < before.size(); ++i) {
-        if (before[i + 1] >= n) {
-            *within = n - before[i];
+        if (before[i + 1] >= failure.n) {
+            *within = failure.n - before[i];
             return i;
         }
     }
@@ -333,12 +362,10 @@ Reference RunReference(const Scenario &scenario) {
     return ref;
 }
 
-void RunWithFailure(const Scenario &scenario, const Reference &ref, Fault fault, uint64_t n,
-                    bool persistent, const StepProbe &probe) {
+void RunWithFailure(const Scenario &scenario, const Reference &ref, const Failure &failure,
+                    const StepProbe &probe) {
     RunControl ctl;
-    ctl.fault = fault;
-    ctl.n = n;
-    ctl.persistent = persistent;
+    ctl.failure = failure;
     ctl.ref = &ref;
     ctl.probe = &probe;
     RunOnce(scenario, ctl);
@@ -349,17 +376,30 @@ Figures Sweep(const Scenario &scenario, Fault fault) {
     const Reference ref = RunReference(scenario);
     if (::testing::Test::HasFailure()) return figures;
     figures.points = fault == Fault::Allocation ? ref.allocations : ref.calls;
-    for (uint64_t n = 1; n <= figures.points; ++n) {
-        for (const bool persistent : {false, true}) {
-            RunWithFailure(scenario, ref, fault, n, persistent);
-            ++figures.runs;
-            // One broken run tells enough; thousands of repeats would bury it.
-            if (::testing::Test::HasFailure()) return figures;
+
+    // Each failure alone: allocations by their number; module calls function by
+    // function, so that the function whose code comes back is known.
+    std::vector<Failure> failures;
+    if (fault == Fault::Allocation) {
+        for (uint64_t n = 1; n <= ref.allocations; ++n) failures.push_back({fault, n, false, ""});
+    } else {
+        for (const auto &[fn, count] : ref.perFunction) {
+            for (uint64_t k = 1; k <= count; ++k) failures.push_back({fault, k, false, fn});
         }
+    }
+    // Then each with every later one, over all functions.
+    for (uint64_t n = 1; n <= figures.points; ++n) failures.push_back({fault, n, true, ""});
+
+    for (const Failure &failure : failures) {
+        RunWithFailure(scenario, ref, failure);
+        ++figures.runs;
+        // One broken run tells enough; thousands of repeats would bury it.
+        if (::testing::Test::HasFailure()) return figures;
+        if (failure.persistent) continue;
         uint64_t within = 0;
-        const size_t step = StepOf(ref, fault, n, &within);
-        figures.failedPairs.insert(scenario.steps[step].name + " #" + std::to_string(step) + "/" +
-                                   std::to_string(within));
+        const size_t step = StepOf(ref, failure, &within);
+        figures.failedPairs.insert(scenario.steps[step].name + " #" + std::to_string(step) + " " +
+                                   failure.function + "/" + std::to_string(within));
     }
     if (fault == Fault::ModuleCall) figures.perFunction = ref.perFunction;
 

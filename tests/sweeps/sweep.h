@@ -129,19 +129,32 @@ struct Reference {
 // Runs the scenario without failures.
 Reference RunReference(const Scenario &scenario);
 
-// Runs the scenario once with failure `n` (1-based, counted from the first step)
-// of `fault`, transient or from it on; checks everything. `after` (optional) is called
-// with the world after the step that holds failure n, and its result.
-using StepProbe = std::function<void(const World &, size_t step, uint32_t rc)>;
-void RunWithFailure(const Scenario &scenario, const Reference &ref, Fault fault, uint64_t n,
-                    bool persistent, const StepProbe &probe = nullptr);
+// One failure to inject: the n-th allocation, or the n-th module call (of `function`
+// only, or of any function when it is empty), alone or with every later one.
+struct Failure {
+    Fault fault = Fault::Allocation;
+    uint64_t n = 0;  // 1-based; 0 injects nothing
+    bool persistent = false;
+    std::string function;
+};
 
-// The whole sweep of one scenario: both modes for every point. Returns its figures and
-// adds them to the process totals printed at exit.
+// Runs the scenario once with `failure`; checks everything. `probe` (optional) is
+// called with the world after the step that holds the failure, and its result.
+using StepProbe = std::function<void(const World &, size_t step, uint32_t rc)>;
+void RunWithFailure(const Scenario &scenario, const Reference &ref, const Failure &failure,
+                    const StepProbe &probe = nullptr);
+
+// The whole sweep of one scenario for `fault`: every allocation, or every module call,
+// failing alone, then every one failing with all that follow it. Returns its figures
+// and adds them to the process totals printed at exit.
 Figures Sweep(const Scenario &scenario, Fault fault);
 
-// The step of the reference run that holds failure n (0-based), and n's index within it.
-size_t StepOf(const Reference &ref, Fault fault, uint64_t n, uint64_t *within);
+// The step of the reference run that holds the failure (0-based), and the failure's
+// index within that step.
+size_t StepOf(const Reference &ref, const Failure &failure, uint64_t *within);
+
+// Module functions whose failure code a library call may pass on as its result.
+bool PassesOnItsCode(const std::string &function);
 
 // The userData values held by entries that own them (ANClearUserData would free them).
 std::set<uint64_t> OwnedBlocks(const World &world);
