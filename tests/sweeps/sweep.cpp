@@ -183,6 +183,7 @@ struct RunControl {
     const Reference *ref = nullptr;
     Reference *record = nullptr;  // filled by the reference run
     const StepProbe *probe = nullptr;
+    size_t probeStep = 0;  // without a failure: the step after which to probe
 };
 
 std::string Describe(const Scenario &s, const Failure &f) {
@@ -254,7 +255,7 @@ void RunOnce(const Scenario &s, const RunControl &ctl) {
     antk::clearFailures();
     anwin::resetCounters();
     antk::resetCalls();
-    size_t hitStep = s.steps.size();
+    size_t hitStep = ctl.probe != nullptr ? ctl.probeStep : s.steps.size();
     if (f.n != 0) {
         uint64_t within = 0;
         hitStep = StepOf(*ctl.ref, f, &within);
@@ -300,7 +301,8 @@ void RunOnce(const Scenario &s, const RunControl &ctl) {
             EXPECT_TRUE(ok) << at << ": gives " << rc << "; may give " << ctl.ref->results[i]
                             << " or " << step.codes.str()
                             << (moduleCodeAllowed ? "" : " without the module's code");
-            if (i == hitStep && f.fault == Fault::Allocation && !step.outOfMemory.empty()) {
+            if (i == hitStep && f.n != 0 && f.fault == Fault::Allocation &&
+                !step.outOfMemory.empty()) {
                 EXPECT_TRUE(step.outOfMemory.contains(rc))
                     << at << ": out of memory gives " << rc << "; expected "
                     << step.outOfMemory.str();
@@ -368,6 +370,15 @@ void RunWithFailure(const Scenario &scenario, const Reference &ref, const Failur
     ctl.failure = failure;
     ctl.ref = &ref;
     ctl.probe = &probe;
+    RunOnce(scenario, ctl);
+}
+
+void RunAndProbe(const Scenario &scenario, const Reference &ref, size_t step,
+                 const StepProbe &probe) {
+    RunControl ctl;
+    ctl.ref = &ref;
+    ctl.probe = &probe;
+    ctl.probeStep = step;
     RunOnce(scenario, ctl);
 }
 

@@ -144,6 +144,10 @@ using StepProbe = std::function<void(const World &, size_t step, uint32_t rc)>;
 void RunWithFailure(const Scenario &scenario, const Reference &ref, const Failure &failure,
                     const StepProbe &probe = nullptr);
 
+// Runs the scenario without failures and calls `probe` after step `step`.
+void RunAndProbe(const Scenario &scenario, const Reference &ref, size_t step,
+                 const StepProbe &probe);
+
 // The whole sweep of one scenario for `fault`: every allocation, or every module call,
 // failing alone, then every one failing with all that follow it. Returns its figures
 // and adds them to the process totals printed at exit.
