@@ -323,13 +323,24 @@ AN_API uint32_t ANClearAnnos(DAHandle doc, uint16_t flags, uint32_t value);
 AN_API uint32_t ANClearUserData(DAHandle doc);
 
 /* Copies every annotation and per-document style of `src` into `dest`, merged by
- * position, without notification; `src` is unchanged. Copying a document onto
- * itself changes nothing. Returns 15 (null handle), a DAGetAnno failure, 18 (no
- * state), otherwise 0; entries that cannot be inserted are missing from `dest`. */
+ * position, without notification; `src` is unchanged. Texts get buffers of their
+ * own; userData values are copied but stay the source's (ANClearUserData on `dest`
+ * leaves them). A source style replaces a destination style with the same id. A
+ * source without annotations copies nothing, not even styles, and gives 0 without
+ * looking at `dest`. Copying a document onto itself changes nothing.
+ * Returns 15 (null handle), a DAGetAnno failure, 18 (no state), `src` examined
+ * first; otherwise 0, and entries that cannot be inserted (out of memory, table
+ * full) are missing from `dest`. */
 AN_API uint32_t ANCopyAnnos(DAHandle dest, DAHandle src);
 
 /* Turns the document's own ranges, from the first not yet examined, into styled
- * type-1 highlights (notification 1 each). Returns 15, a DAGetAnno failure, 18, or 0. */
+ * type-1 highlights (notification 1 each) whose tags have bit 31 set and whose
+ * userData is the range's first item id (never freed by ANClearUserData). Every
+ * range is examined once: one whose code is not built, whose end item cannot be
+ * found or whose highlight cannot be added is passed over for good, and clearing
+ * does not bring built ranges back. When the chunker cannot tell how many ranges
+ * there are, nothing is examined and a later call starts from the same range.
+ * Returns 15 (null doc), a DAGetAnno failure, 18 (no state), otherwise 0. */
 AN_API uint32_t ANBuildAnnos(DAHandle doc);
 
 /* ---- Positions ------------------------------------------------------------------------------------------------------ */
