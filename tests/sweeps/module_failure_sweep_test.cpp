@@ -44,4 +44,14 @@ TEST_F(ModuleFailureSweep, MappingSurvivesEveryFailedModuleCall) {
     SweepScenario(sweep::Mapping());
 }
 
+TEST_F(ModuleFailureSweep, RangeSplittingSurvivesEveryFailedModuleCall) {
+    ANNO_REQUIRE_PLATFORM_CONTROLS();
+    SweepScenario(sweep::RangeSplitting());
+}
+
+TEST_F(ModuleFailureSweep, CopyingAndBuildingSurviveEveryFailedModuleCall) {
+    ANNO_REQUIRE_PLATFORM_CONTROLS();
+    SweepScenario(sweep::CopyingAndBuilding());
+}
+
 }  // namespace

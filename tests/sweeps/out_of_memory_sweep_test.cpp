@@ -39,4 +39,14 @@ TEST_F(OutOfMemorySweep, MappingSurvivesEveryFailedAllocation) {
     SweepScenario(sweep::Mapping());
 }
 
+TEST_F(OutOfMemorySweep, RangeSplittingSurvivesEveryFailedAllocation) {
+    ANNO_REQUIRE_PLATFORM_CONTROLS();
+    SweepScenario(sweep::RangeSplitting());
+}
+
+TEST_F(OutOfMemorySweep, CopyingAndBuildingSurviveEveryFailedAllocation) {
+    ANNO_REQUIRE_PLATFORM_CONTROLS();
+    SweepScenario(sweep::CopyingAndBuilding());
+}
+
 }  // namespace

@@ -345,6 +345,19 @@ Step NextChunkerPos(size_t doc, ANPos pos) {
         kNextChunkerCodes);
 }
 
+Step Copy(size_t dest, size_t src) {
+    // Entries that cannot be copied are only missing from the destination.
+    return Make("ANCopyAnnos " + std::to_string(src) + " to " + std::to_string(dest),
+                [=](World &w) { return ANCopyAnnos(w.doc(dest), w.doc(src)); }, kCopyCodes,
+                {AN_OK});
+}
+
+Step Build(size_t doc) {
+    // Ranges that cannot be added are passed over.
+    return Make("ANBuildAnnos " + std::to_string(doc),
+                [=](World &w) { return ANBuildAnnos(w.doc(doc)); }, kBuildCodes, {AN_OK});
+}
+
 Step Walk(size_t doc, ANPos from, size_t track, size_t text) {
     return Make(
         "walk from " + Str(from),
@@ -547,8 +560,108 @@ Scenario Mapping() {
     return s;
 }
 
+Scenario RangeSplitting() {
+    Scenario s;
+    s.name = "range splitting";
+    s.prepare = [](World &w) {
+        antk::DocumentBuilder builder;
+        for (uint32_t i = 0; i < 24; ++i) {
+            if (i == 2 || i == 6 || i == 11 || i == 12 || i == 20) {
+                builder.cutItem();
+            } else if (i == 4 || i == 13) {
+                builder.skippedItem(antk::kItemSkip);
+            } else if (i == 9) {
+                builder.skippedItem(antk::kItemSkip2);
+            } else if (i == 7) {
+                builder.textItem("abcdef");  // characters 0 to 5
+            } else {
+                builder.item(antk::kItemParagraph);
+            }
+        }
+        w.docs.push_back(builder.build());
+        w.NewBlock();
+        w.NewBlock();
+    };
+    std::vector<Step> &st = s.steps;
+    st.push_back(InitDoc(0));
+    // Annotation text at item 3 with a placeholder in it: a cut inside the text.
+    st.push_back(AddText(0, Pos(3), u"xy", 40));
+    st.push_back(AddUnit(0, Pos(3), 41));
+    st.push_back(AddText(0, Pos(3), u"zw", 42));
+    st.push_back(AddUnit(0, Pos(6), 43, AN_TYPE_CUTMARK));  // a cut already marked
+    st.push_back(AddRange(0, Pos(0), Pos(16), 44, 0));
+    st.push_back(AddRange(0, Pos(7, 1), Pos(7, 4), 45));
+    st.push_back(AddRange(0, Pos(15), Pos(18), 46, 1));       // overlaps the first: merged
+    st.push_back(AddRange(0, Pos(13), Pos(14), 47, -1, 40));  // on a skipped item
+    st.push_back(AddRange(0, Pos(19), Pos(19), 48, -1, 44));  // empty: one step
+    st.push_back(AddRange(0, Pos(23), Pos(21), 49));          // given backwards
+    st.push_back(AddRange(0, Pos(12), Pos(22), 50));          // over existing pieces
+    st.push_back(StartTextTrack(0));
+    st.push_back(Walk(0, Pos(0), 0, 0));
+    st.push_back(Find(0, ANFIND_AFTER | ANFIND_EQUAL, 44, Pos(1)));
+    st.push_back(Clear(0, ANCLEAR_EQUAL, 44));
+    st.push_back(ClearUserData(0));
+    st.push_back(AddRange(0, Pos(0), Pos(8), 51));  // again where pieces were
+    st.push_back(Clear(0, ANCLEAR_EQUAL, 41));      // the placeholder: its texts join
+    st.push_back(Walk(0, Pos(0), 1, 0));
+    st.push_back(EndTextTrack(0));
+    st.push_back(DeInitDoc(0));
+    return s;
+}
+
+Scenario CopyingAndBuilding() {
+    Scenario s;
+    s.name = "copying and building";
+    s.prepare = [](World &w) {
+        // Range codes the library builds highlights from, and one it passes over.
+        constexpr uint32_t kCodes[] = {0x8003000C, 0x80020008, 0x84000010,
+                                       0x81000000, 0x82000000, 0x12345678};
+        w.docs.push_back(PlainAndTextDocument());  // 0: the source
+        w.docs.push_back(PlainAndTextDocument());  // 1: a destination with annotations
+        w.docs.push_back(PlainAndTextDocument());  // 2: an empty destination
+        antk::DocumentBuilder builder;             // 3: a document with its own ranges
+        for (uint32_t r = 0; r < 12; ++r) {
+            const uint32_t code = kCodes[r % 6];
+            const uint32_t first = builder.item(antk::kItemParagraph);
+            builder.range(first, code);
+            builder.textItem("in range");
+            if (r != 7) builder.item(antk::kItemRangeEnd, code);  // range 7 never ends
+        }
+        builder.textItem("after");
+        w.docs.push_back(builder.build());
+        w.NewBlock();
+    };
+    std::vector<Step> &st = s.steps;
+    for (size_t d = 0; d < 4; ++d) st.push_back(InitDoc(d));
+    for (uint32_t id = 1; id <= 12; ++id) st.push_back(AddDocStyle(0, id));
+    st.push_back(AddDocStyle(1, 5));
+    st.push_back(AddDocStyle(1, 50));
+    st.push_back(AddText(0, Pos(3), std::u16string(70, u's'), 60, 0));
+    st.push_back(AddUnit(0, TextPos(3, ANPOS_NOSUBITEM, 30), 61));
+    st.push_back(AddText(0, Pos(8), u"src", 62));
+    st.push_back(AddHilite(0, Pos(1), Pos(5), 63, ANSTYLEWORD_NUMBER | 5));
+    for (uint32_t i = 0; i < 8; ++i) st.push_back(AddPoint(0, Pos(10 + i), 64 + i));
+    st.push_back(AddRange(0, Pos(20), Pos(25), 72));
+    st.push_back(AddText(1, Pos(3), u"dest", 80));
+    st.push_back(AddText(1, Pos(8), std::u16string(62, u'd'), 81));
+    st.push_back(AddPoint(1, Pos(4), 82));
+    st.push_back(Copy(2, 0));
+    st.push_back(Copy(1, 0));
+    st.push_back(Build(3));
+    st.push_back(Build(3));
+    st.push_back(StartTextTrack(0));
+    st.push_back(Walk(1, Pos(0), 0, 0));
+    st.push_back(Walk(3, Pos(0), 1, 0));
+    st.push_back(EndTextTrack(0));
+    st.push_back(Clear(1, ANCLEAR_MASK, 0));
+    st.push_back(ClearUserData(0));
+    for (size_t d = 0; d < 4; ++d) st.push_back(DeInitDoc(d));
+    return s;
+}
+
 std::vector<Scenario> AllScenarios() {
-    return {StylesAndAnnotations(), AnnotationText(), Mapping()};
+    return {StylesAndAnnotations(), AnnotationText(), Mapping(), RangeSplitting(),
+            CopyingAndBuilding()};
 }
 
 }  // namespace sweep

@@ -63,6 +63,9 @@ Step Find(size_t doc, uint16_t mode, uint32_t tag, ANPos key = ANPos{}, uint16_t
 Step Event(size_t doc, uint32_t event, uint16_t entry, ANPos pos);
 Step NextChunkerPos(size_t doc, ANPos pos);
 
+Step Copy(size_t dest, size_t src);
+Step Build(size_t doc);
+
 // Walks the document from `from` with ANNextPos to its end, tracking with record
 // `track` and reading annotation text with text track `text` at every text position;
 // checks each call's result and that the walk moves forward and ends. Gives the
@@ -82,6 +85,13 @@ Scenario AnnotationText();
 // Position mapping over three chunks of two documents (one read wide): maps made,
 // swapped and evicted.
 Scenario Mapping();
+
+// Range annotations fitted to a document with cut items, skipped items, placeholders
+// in annotation text and an existing cut marker: pieces, markers, merges.
+Scenario RangeSplitting();
+// Copying annotations and styles into an empty and into an annotated document, and
+// building highlights from a document's own ranges, twice.
+Scenario CopyingAndBuilding();
 
 std::vector<Scenario> AllScenarios();
 
