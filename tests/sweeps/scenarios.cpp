@@ -345,6 +345,36 @@ Step NextChunkerPos(size_t doc, ANPos pos) {
         kNextChunkerCodes);
 }
 
+Step NextAnnoTextPos(size_t doc, ANPos pos) {
+    return Make(
+        "ANNextAnnoTextPos " + Str(pos),
+        [=](World &w) {
+            ANPos next{};
+            return ANNextAnnoTextPos(w.doc(doc), &pos, &next);
+        },
+        kNextChunkerCodes);
+}
+
+Step NextPos(size_t doc, ANPos pos) {
+    return Make(
+        "ANNextPos " + Str(pos),
+        [=](World &w) {
+            ANPos next{};
+            return ANNextPos(w.doc(doc), &pos, &next);
+        },
+        Codes{AN_OK, AN_ERR_NOTFOUND});
+}
+
+Step SetCallback(size_t doc, bool on) {
+    return Make(
+        std::string("ANSetCallback ") + (on ? "on" : "off"),
+        [=](World &w) {
+            return on ? ANSetCallback(w.doc(doc), &annotest::Notifications::Callback, &w.notes)
+                      : ANSetCallback(w.doc(doc), nullptr, nullptr);
+        },
+        Codes{AN_OK, AN_ERR_NOSTATE, M});
+}
+
 Step Copy(size_t dest, size_t src) {
     // Entries that cannot be copied are only missing from the destination.
     return Make("ANCopyAnnos " + std::to_string(src) + " to " + std::to_string(dest),
@@ -504,12 +534,17 @@ Scenario AnnotationText() {
     st.push_back(StartTextTrack(1));
     st.push_back(Walk(0, Pos(0), 0, 1));
     st.push_back(NextChunkerPos(0, Pos(kTextItem, 3)));
+    st.push_back(NextAnnoTextPos(0, TextPos(5, ANPOS_NOSUBITEM, 3)));
+    st.push_back(NextPos(0, TextPos(5, ANPOS_NOSUBITEM, 5)));
     st.push_back(Find(0, ANFIND_FIRST | ANFIND_EQUAL, 66));
     st.push_back(Find(0, ANFIND_FIRST | ANFIND_EQUAL, 25));
     st.push_back(Find(0, ANFIND_AT | ANFIND_MASK, 0, TextPos(3, ANPOS_NOSUBITEM, 5)));
 
     // Removing the placeholders joins the texts around them.
-    st.push_back(Clear(0, ANCLEAR_EQUAL, 66));
+    // Without a callback, a join that runs out of memory shows in the result.
+    st.push_back(SetCallback(0, false));
+    st.push_back(OnOutOfMemory(Clear(0, ANCLEAR_EQUAL, 66), {AN_ERR_NOMEM}));
+    st.push_back(SetCallback(0, true));
     st.push_back(Clear(0, ANCLEAR_EQUAL, 67));
     st.push_back(GetText(0, 0, TextPos(5, ANPOS_NOSUBITEM, 2)));
     st.push_back(Walk(0, Pos(0), 1, 1));

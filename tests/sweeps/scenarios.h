@@ -62,6 +62,10 @@ Step MapPos(size_t doc, ANPos pos);
 Step Find(size_t doc, uint16_t mode, uint32_t tag, ANPos key = ANPos{}, uint16_t flags = 0);
 Step Event(size_t doc, uint32_t event, uint16_t entry, ANPos pos);
 Step NextChunkerPos(size_t doc, ANPos pos);
+Step NextAnnoTextPos(size_t doc, ANPos pos);
+Step NextPos(size_t doc, ANPos pos);
+// Switches the document's callback off, or back to World::notes.
+Step SetCallback(size_t doc, bool on);
 
 Step Copy(size_t dest, size_t src);
 Step Build(size_t doc);

@@ -90,6 +90,12 @@ struct Step {
     Codes normal = Codes{AN_OK};
 };
 
+// The step, giving `codes` when an allocation inside it fails.
+inline Step OnOutOfMemory(Step step, Codes codes) {
+    step.outOfMemory = std::move(codes);
+    return step;
+}
+
 // The step, giving `normal` in the unfailed run.
 inline Step Expect(Step step, Codes normal) {
     step.normal = std::move(normal);
