@@ -4,6 +4,7 @@
 #include <utility>
 
 #include "anno/toolkit.h"
+#include "binding/instance.h"
 #include "queries/queries.h"
 #include "support/fixture.h"
 
@@ -79,6 +80,23 @@ uint32_t AddStyleRecord(uint32_t id, bool olderForm,
     s.size = ANHILITESTYLE_SIZE_OLD;
     std::memcpy(old, &s, sizeof old);
     return add(reinterpret_cast<const ANHiliteStyle *>(old));
+}
+
+// ANAddAnno, checking that the callback hears of the annotation exactly once when it
+// was added, and not at all when the add failed.
+uint32_t AddAnno(World &w, size_t doc, uint16_t type, const void *descriptor) {
+    auto heardOfAdding = [&w] {
+        size_t n = 0;
+        for (const annotest::Notification &note : w.notes.calls) n += note.code == ANNOTIFY_ADDED;
+        return n;
+    };
+    const size_t before = heardOfAdding();
+    const uint32_t rc = ANAddAnno(w.doc(doc), type, descriptor);
+    const auto *state = static_cast<const ANInstance *>(antk::annoSlot(w.doc(doc)));
+    const bool listening = state != nullptr && state->callback != nullptr;
+    EXPECT_EQ(heardOfAdding() - before, rc == AN_OK && listening ? 1u : 0u)
+        << "notifications of adding a type-" << type << " annotation that gave " << rc;
+    return rc;
 }
 
 }  // namespace
@@ -168,7 +186,7 @@ Step AddHilite(size_t doc, ANPos start, ANPos end, uint32_t tag, uint32_t style,
                     } else {
                         std::memcpy(bytes + 44, &style, 4);
                     }
-                    return ANAddAnno(w.doc(doc), AN_TYPE_HILITE, bytes);
+                    return AddAnno(w, doc, AN_TYPE_HILITE, bytes);
                 },
                 kAddCodes, {AN_ERR_NOMEM});
 }
@@ -192,7 +210,7 @@ Step AddPoint(size_t doc, ANPos pos, uint32_t tag, uint16_t type, uint32_t form)
                         std::memcpy(bytes + 56, &value,
                                     8);  // value, or the 64-byte form's 64-bit value
                     }
-                    return ANAddAnno(w.doc(doc), type, bytes);
+                    return AddAnno(w, doc, type, bytes);
                 },
                 kAddCodes, {AN_ERR_NOMEM});
 }
@@ -208,7 +226,7 @@ Step AddRange(size_t doc, ANPos start, ANPos end, uint32_t tag, int block, uint3
                     d.start = start;
                     d.end = end;
                     d.userData = form == 48 ? BlockOf(w, block) : 0;
-                    return ANAddAnno(w.doc(doc), AN_TYPE_RANGE, &d);
+                    return AddAnno(w, doc, AN_TYPE_RANGE, &d);
                 },
                 kAddCodes, {AN_OK, AN_ERR_NOMEM});
 }
@@ -224,7 +242,7 @@ Step AddText(size_t doc, ANPos pos, std::u16string text, uint32_t tag, int block
                     d.userData = BlockOf(w, block);
                     d.text = reinterpret_cast<const uint16_t *>(text.data());
                     d.textLength = static_cast<uint32_t>(text.size());
-                    return ANAddAnno(w.doc(doc), AN_TYPE_TEXT, &d);
+                    return AddAnno(w, doc, AN_TYPE_TEXT, &d);
                 },
                 kAddCodes, {AN_ERR_NOMEM});
 }
@@ -237,7 +255,7 @@ Step AddUnit(size_t doc, ANPos pos, uint32_t tag, uint16_t type, uint32_t form) 
             d.size = form;
             d.tag = tag;
             d.pos = pos;
-            return ANAddAnno(w.doc(doc), type, &d);
+            return AddAnno(w, doc, type, &d);
         },
         kAddCodes, {AN_ERR_NOMEM});
 }
