@@ -22,7 +22,39 @@ std::string Str(const ANPos &p) { return ::testing::PrintToString(p); }
 
 bool Same(const ANPos &a, const ANPos &b) { return std::memcmp(&a, &b, sizeof a) == 0; }
 
-class HostilePositions : public hostile::HostileTest {};
+class HostilePositions : public hostile::HostileTest {
+ protected:
+    // Walks `doc` from `from` to its end, tracking and reading annotation text at every
+    // position and finding from it; each call within its results, the walk moving on.
+    static void WalkEverything(DAHandle doc, const ANPos &from) {
+        ANTrackInfo track{};
+        ANAnnoTextTrack text{};
+        ASSERT_EQ(ANStartAnnoTextTrack(doc, &text), AN_OK);
+        Tried(ANStartAnnoTrack(doc, &from, &track));
+        ANPos p = from;
+        uint32_t steps = 0;
+        for (; steps < 5000; ++steps) {
+            ASSERT_EQ(Tried(ANTrackAnno(doc, &p, &track)) & ~uint32_t{0x3F}, 0u) << Str(p);
+            uint16_t unit = 0;
+            const uint32_t got = Tried(ANGetAnnoText(doc, &text, &p, &unit));
+            ASSERT_TRUE(got == ANTEXT_UNIT_FOUND || got == ANTEXT_PLACEHOLDER_FOUND ||
+                        got == AN_ERR_NOTFOUND)
+                << got;
+            ANFindRecord find{};
+            find.size = ANFINDRECORD_SIZE;
+            find.mode = ANFIND_AT | ANFIND_MASK;
+            find.key = p;
+            const uint32_t found = Tried(ANFindAnno(doc, 0, &find));
+            ASSERT_TRUE(found == AN_OK || found == AN_ERR_NOTFOUND) << found;
+            ANPos next{};
+            if (Tried(ANNextPos(doc, &p, &next)) != AN_OK) break;
+            ASSERT_LT(ANCompPos(&p, &next), 0) << Str(p) << " to " << Str(next);
+            p = next;
+        }
+        EXPECT_LT(steps, 5000u) << "the walk does not end";
+        EXPECT_EQ(ANEndAnnoTextTrack(doc, &text), AN_OK);
+    }
+};
 
 TEST_F(HostilePositions, ComparingGivesOneTotalOrderOverEveryKind) {
     const std::vector<ANPos> positions = hostile::HostilePositions();
@@ -358,6 +390,20 @@ TEST_F(HostilePositions, AddingAndClearingAtAnyPositionKeepsTheTableWhole) {
             }
             ASSERT_TRUE(annotest::TableInvariantsHold(doc));
         }
+    }
+    // What the hostile table holds can be walked, tracked, read, searched and copied.
+    annotest::Doc annotated(hostile::HostileDocument());
+    annotest::Doc empty(hostile::HostileDocument());
+    ASSERT_EQ(ANInit(annotated, nullptr, nullptr, nullptr), AN_OK);
+    ASSERT_EQ(ANInit(empty, nullptr, nullptr, nullptr), AN_OK);
+    Annotate(annotated);
+    EXPECT_EQ(Tried(ANCopyAnnos(annotated, doc)), AN_OK);
+    EXPECT_EQ(Tried(ANCopyAnnos(empty, doc)), AN_OK);
+    EXPECT_EQ(annotest::ListedEntries(empty).size(), annotest::ListedEntries(doc).size());
+    for (DAHandle d : {doc.get(), annotated.get(), empty.get()}) {
+        ASSERT_TRUE(annotest::TableInvariantsHold(d));
+        WalkEverything(d, Pos(0));
+        WalkEverything(d, TextPos(3, ANPOS_NOSUBITEM, 0));
     }
     // Texts and placeholders go first, each position's at a time, then the rest.
     for (size_t i = 0; i < positions.size(); ++i) {
