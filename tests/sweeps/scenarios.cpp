@@ -543,6 +543,12 @@ Scenario AnnotationText() {
     // Text at a character, and an empty text.
     st.push_back(AddText(0, Pos(kTextItem, 2), u"zz", 27));
     st.push_back(AddText(0, Pos(7), u"", 28));
+    // Text on the text item itself and at its first character: one anchor in the order.
+    st.push_back(AddText(0, Pos(kTextItem), u"on item", 29));
+    st.push_back(AddText(0, Pos(kTextItem, 0), u"at char", 30));
+    st.push_back(AddHilite(0, Pos(kTextItem), Pos(kTextItem, 1), 31));
+    st.push_back(AddUnit(0, TextPos(kTextItem, ANPOS_NOSUBITEM, 3), 32));
+    st.push_back(AddUnit(0, Pos(kTextItem, 0), 32));
 
     st.push_back(StartTextTrack(0));
     st.push_back(GetText(0, 0, TextPos(5, ANPOS_NOSUBITEM, 0)));
@@ -569,6 +575,8 @@ Scenario AnnotationText() {
     st.push_back(EndTextTrack(0));
     st.push_back(ClearUserData(0));
     st.push_back(Clear(0, ANCLEAR_EQUAL, 12));
+    st.push_back(Clear(0, ANCLEAR_EQUAL, 29));
+    st.push_back(Clear(0, ANCLEAR_EQUAL, 32));
     st.push_back(Clear(0, ANCLEAR_MASK, 0));
     st.push_back(EndTextTrack(1));
     st.push_back(DeInitDoc(0));
