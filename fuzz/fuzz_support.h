@@ -77,7 +77,15 @@ struct Entry {
 const ANEntryTable *TableOf(DAHandle doc);
 std::vector<Entry> ListEntries(DAHandle doc);
 // Index of each slot in a listing, -1 for slots not listed.
-std::vector<int> ListIndex(const std::vector<Entry> &list);
+class SlotIndex {
+ public:
+    explicit SlotIndex(const std::vector<Entry> &list);
+    int operator[](uint16_t slot) const { return slot < at_.size() ? at_[slot] : -1; }
+
+ private:
+    std::vector<int> at_;
+};
+inline SlotIndex ListIndex(const std::vector<Entry> &list) { return SlotIndex(list); }
 // Whether two listings are the same entries with the same records and texts.
 bool SameListing(const std::vector<Entry> &a, const std::vector<Entry> &b);
 // The whole table block as bytes (empty without a table): read-only calls keep it.

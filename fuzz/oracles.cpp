@@ -79,7 +79,7 @@ WalkCounts CheckTrackingWalk(DAHandle doc, const ANPos &start, const std::vector
                              uint32_t markLeft) {
     WalkCounts counts;
     const std::vector<Entry> list = ListEntries(doc);
-    const std::vector<int> at = ListIndex(list);
+    const SlotIndex at = ListIndex(list);
     const bool bound = antk::annoSlot(doc) != nullptr;
 
     ANTrackInfo track;
@@ -377,7 +377,7 @@ void CheckEvent(const std::vector<Entry> &list, uint32_t event, uint16_t entry, 
         const Entry *entry;
     };
     std::vector<Delivery> expected;
-    const std::vector<int> at = ListIndex(list);
+    const SlotIndex at = ListIndex(list);
     const bool live = entry == AN_NONE || at[entry] >= 0;
     // Entries from `from` on, up to the first starting after `p`, that contain `p`
     // (and, for crossings, not `other`).
