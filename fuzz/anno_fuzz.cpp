@@ -1443,5 +1443,12 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t *data, size_t size) {
     annofuzz::Input in(data, size);
     annofuzz::Run run(in);
     run.Go();
+    // A line per million calls, so that a long run shows its progress in its log.
+    static uint64_t reported = 0;
+    if (annofuzz::apiCalls / 1000000 > reported) {
+        reported = annofuzz::apiCalls / 1000000;
+        std::fprintf(stderr, "anno_fuzz: %llu API calls so far\n",
+                     static_cast<unsigned long long>(annofuzz::apiCalls));
+    }
     return 0;
 }
