@@ -510,7 +510,16 @@ void Run::Go() {
         anwin::clearFailures();
 #endif
         CheckRules(trail.back().c_str());
-        if (trace) std::fprintf(stderr, "anno_fuzz: done %s\n", trail.back().c_str());
+        if (trace) {
+            std::fprintf(stderr, "anno_fuzz: done %s\n", trail.back().c_str());
+            for (const Document *doc : {&a_, &b_}) {
+                for (const Entry &e : ListEntries(doc->handle)) {
+                    std::fprintf(stderr, "    %s slot %u type %u tag %u %s to %s\n",
+                                 doc == &a_ ? "A" : "B", e.slot, e.type, e.record.tag,
+                                 Text(e.record.start).c_str(), Text(e.record.end).c_str());
+                }
+            }
+        }
     }
     Finish();
 }
