@@ -232,6 +232,9 @@ void ShiftTextPositions(ANEntryTable *table, uint16_t type, ANAnnoRecord *record
                 end.textIndex > k) {
                 end.textIndex = ShiftedIndex(end.textIndex, width);
             }
+            // An empty range at k (or one ending at k under the other spelling of the
+            // anchor) would now end before its start: it stays empty where its start went.
+            if (HasExtent(entry.type) && ANPosBefore(end, start)) end = start;
         } else {
             if (HasExtent(entry.type) && ANPosEqual(end, anchor)) {
                 // A range that ended at the anchor now ends where the new text begins,
