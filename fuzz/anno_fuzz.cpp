@@ -1246,7 +1246,10 @@ void Run::Step(Document &d) {
             const bool excused = Cmp(stray, c) < 0;
             if (!met && !excused) {
                 std::string seen;
-                for (const ANPos &w : walk) seen += " " + Text(w);
+                for (const ANPos &w : walk) {
+                    seen += ' ';
+                    seen += Text(w);
+                }
                 Fail("the walk missed " + Text(c) + "; walked" + seen);
             }
         }

@@ -1,5 +1,6 @@
 #include "support/table_rules.h"
 
+#include <cstdio>
 #include <vector>
 
 #include "anno/toolkit.h"
@@ -43,9 +44,13 @@ std::string WalkList(const ANEntryTable *t, uint16_t head, uint16_t tail, int ma
 }  // namespace
 
 std::string PosText(const ANPos &pos) {
-    std::string out = "(" + std::to_string(pos.itemId) + ", ";
-    out += pos.subItemId == ANPOS_NOSUBITEM ? std::string("-") : std::to_string(pos.subItemId);
-    return out + ", " + std::to_string(pos.kind) + ", " + std::to_string(pos.textIndex) + ")";
+    char sub[16] = "-";
+    if (pos.subItemId != ANPOS_NOSUBITEM)
+        std::snprintf(sub, sizeof sub, "%u", static_cast<unsigned>(pos.subItemId));
+    char out[64];
+    std::snprintf(out, sizeof out, "(%u, %s, %u, %u)", static_cast<unsigned>(pos.itemId), sub,
+                  static_cast<unsigned>(pos.kind), static_cast<unsigned>(pos.textIndex));
+    return out;
 }
 
 std::string TableRulesBroken(const ANEntryTable *t) {
