@@ -39,11 +39,13 @@ inline bool ANSameAnchor(const ANPos &a, const ANPos &b) {
 }
 
 // The position one step after `pos` as point annotations use it: the next text index
-// inside annotation text, otherwise the next subItemId (0xFFFFFFFF wraps to 0).
+// inside annotation text, otherwise the next subItemId (0xFFFFFFFF wraps to 0). The
+// greatest text index has no next one (no anchor's text reaches it): it is its own
+// step, where a wrap to index 0 would put the step before the position.
 inline ANPos ANStepAfter(const ANPos &pos) {
     ANPos next = pos;
     if (pos.kind == ANPOS_ANNOTEXT) {
-        next.textIndex++;
+        if (next.textIndex != UINT32_MAX) next.textIndex++;
     } else {
         next.subItemId++;
     }

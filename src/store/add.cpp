@@ -210,6 +210,10 @@ uint32_t ANAddRecord(DAHandle doc, uint16_t type, ANAnnoRecord *record, uint32_t
     } else {
         std::memcpy(&entry, record, EntryBytes(type));
         if (type != AN_TYPE_HILITE) entry.end = ANStepAfter(entry.start);
+        // Annotation text whose one step wraps round (at sub-item 0xFFFFFFFE) would,
+        // with its ends swapped, go to another anchor than the one it names.
+        const bool text = type == AN_TYPE_TEXT || type == AN_TYPE_PLACEHOLDER;
+        if (text && ANPosBefore(entry.end, entry.start)) return AN_ERR_BADARG;
     }
 
     if (insert) {

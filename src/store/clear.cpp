@@ -281,13 +281,24 @@ extern "C" AN_API uint32_t ANClearAnnos(DAHandle doc, uint16_t flags, uint32_t v
     ANEntryTable *table = instance->entries;
     if (table == nullptr) return AN_OK;
 
-    ANClearWalk walk{instance, table, table->first, flags, value};
     uint32_t status = kStatusOk;
-    while (walk.cursor != AN_NONE) {
-        const uint16_t index = walk.cursor;
-        walk.cursor = ANSlot(table, index).next;
-        if (ANIsSelected(ANSlot(table, index).record.tag, flags, value)) {
-            status = ANRemoveEntry(walk, index, status);
+    // Removing text renumbers positions, and restoring the list's order afterwards can
+    // move an entry the walk has not reached in front of the ones it has; a selected
+    // one is then removed by another pass. Each pass removes at least the first
+    // selected entry of the list, so the passes end.
+    bool again = true;
+    while (again) {
+        ANClearWalk walk{instance, table, table->first, flags, value};
+        while (walk.cursor != AN_NONE) {
+            const uint16_t index = walk.cursor;
+            walk.cursor = ANSlot(table, index).next;
+            if (ANIsSelected(ANSlot(table, index).record.tag, flags, value)) {
+                status = ANRemoveEntry(walk, index, status);
+            }
+        }
+        again = false;
+        for (uint16_t i = table->first; i != AN_NONE && !again; i = ANSlot(table, i).next) {
+            again = ANIsSelected(ANSlot(table, i).record.tag, flags, value);
         }
     }
     if (table->count == 0) {

@@ -227,6 +227,13 @@ uint16_t LastBeforeAnchor(const ANInstance *instance, const ANPos &anchor) {
     return r == 0 ? AN_NONE : ANIndexArraysOf(index).order[r - 1];
 }
 
+// A text index moved up by `width`. Indices past every unit an anchor's text can
+// hold come only from callers; they stop at the greatest index rather than wrap round
+// below the indices they sorted after, which would put an entry's start after its end.
+uint32_t ShiftedIndex(uint32_t index, uint32_t width) {
+    return index > UINT32_MAX - width ? UINT32_MAX : index + width;
+}
+
 // Moves the text positions of the entries around new text of `width` units
 // that goes in at record.start (b = units already before it at the anchor), and
 // the record's own text positions.
@@ -254,13 +261,16 @@ void ShiftTextPositions(ANInstance *instance, uint16_t type, ANAnnoRecord *recor
                                           entry.type == AN_TYPE_TEXT && start.textIndex == k;
                 const bool moves =
                     HasExtent(entry.type) || entry.type == AN_TYPE_TEXT || start.textIndex > k;
-                if (moves && !keepsItsText) start.textIndex += width;
+                if (moves && !keepsItsText) start.textIndex = ShiftedIndex(start.textIndex, width);
                 if (!HasExtent(entry.type)) end = ANStepAfter(start);
             }
             if (HasExtent(entry.type) && end.kind == ANPOS_ANNOTEXT && ANSameAnchor(end, anchor) &&
                 end.textIndex > k) {
-                end.textIndex += width;
+                end.textIndex = ShiftedIndex(end.textIndex, width);
             }
+            // An empty range at k (or one ending at k under the other spelling of the
+            // anchor) would now end before its start: it stays empty where its start went.
+            if (HasExtent(entry.type) && ANPosBefore(end, start)) end = start;
         } else {
             if (HasExtent(entry.type) && ANPosEqual(end, anchor)) {
                 // A range that ended at the anchor now ends where the new text begins,
@@ -287,8 +297,12 @@ void ShiftTextPositions(ANInstance *instance, uint16_t type, ANAnnoRecord *recor
             changed = true;
         }
     }
-    if (record->start.kind == ANPOS_ANNOTEXT) record->start.textIndex += width;
-    if (record->end.kind == ANPOS_ANNOTEXT) record->end.textIndex += width;
+    if (record->start.kind == ANPOS_ANNOTEXT) {
+        record->start.textIndex = ShiftedIndex(record->start.textIndex, width);
+    }
+    if (record->end.kind == ANPOS_ANNOTEXT) {
+        record->end.textIndex = ShiftedIndex(record->end.textIndex, width);
+    }
 }
 
 // A placeholder that goes inside the text of the following entry X splits

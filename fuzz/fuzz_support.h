@@ -1,0 +1,100 @@
+// What the fuzz target's parts share: the reader that turns the input bytes into
+// choices, the count of library calls made, failure reports, and a plain view of a
+// document's annotation table.
+#ifndef ANNO_FUZZ_SUPPORT_H
+#define ANNO_FUZZ_SUPPORT_H
+
+#include <cstddef>
+#include <cstdint>
+#include <string>
+#include <vector>
+
+#include "anno/anno.h"
+#include "store/table.h"
+
+namespace annofuzz {
+
+// Reads choices from the input; past its end every read gives 0, so any input,
+// however short, decodes into something.
+class Input {
+ public:
+    Input(const uint8_t *data, size_t size) : data_(data), size_(size) {}
+    bool done() const { return pos_ >= size_; }
+    uint8_t byte() { return pos_ < size_ ? data_[pos_++] : 0; }
+    uint32_t u16() { return byte() | static_cast<uint32_t>(byte()) << 8; }
+    uint32_t u32() { return u16() | u16() << 16; }
+    // A value below n (n > 0): one byte for small n, more for large ones.
+    uint32_t below(uint32_t n) {
+        if (n <= 1) return 0;
+        if (n <= 256) return byte() % n;
+        if (n <= 65536) return u16() % n;
+        return u32() % n;
+    }
+    // True with probability about k/256.
+    bool chance(uint32_t k) { return byte() < k; }
+
+ private:
+    const uint8_t *data_;
+    size_t size_;
+    size_t pos_ = 0;
+};
+
+// Library calls made by the target so far, over all inputs.
+extern uint64_t apiCalls;
+// Counts one library call: CALL(ANAddAnno(doc, type, desc)).
+#define CALL(expr) (++::annofuzz::apiCalls, (expr))
+
+// What the current operation is, for failure reports.
+void SetContext(const std::string &what);
+// Reports a broken expectation with the context and the input's operations so far,
+// then aborts (a finding for the fuzzer, a failed test for the replay).
+[[noreturn]] void Fail(const std::string &what);
+#define CHECK(cond, what)                                                  \
+    do {                                                                   \
+        if (!(cond)) ::annofuzz::Fail(std::string(#cond) + ": " + (what)); \
+    } while (0)
+
+inline int Cmp(const ANPos &a, const ANPos &b) { return ANCompPos(&a, &b); }
+inline bool Same(const ANPos &a, const ANPos &b) {
+    return a.itemId == b.itemId && a.subItemId == b.subItemId && a.kind == b.kind &&
+           a.textIndex == b.textIndex;
+}
+inline bool SameAnchor(const ANPos &a, const ANPos &b) {
+    return a.itemId == b.itemId && a.subItemId == b.subItemId;
+}
+std::string Text(const ANPos &pos);
+
+// One entry of the ordered list, copied out.
+struct Entry {
+    uint16_t slot;
+    uint16_t type;
+    uint16_t flags;
+    ANAnnoRecord record;
+    std::u16string text;  // type 5: its units
+};
+
+// The table of a document (null without state or table) and its entries in list order.
+const ANEntryTable *TableOf(DAHandle doc);
+std::vector<Entry> ListEntries(DAHandle doc);
+// Index of each slot in a listing, -1 for slots not listed.
+class SlotIndex {
+ public:
+    explicit SlotIndex(const std::vector<Entry> &list);
+    int operator[](uint16_t slot) const { return slot < at_.size() ? at_[slot] : -1; }
+
+ private:
+    std::vector<int> at_;
+};
+inline SlotIndex ListIndex(const std::vector<Entry> &list) { return SlotIndex(list); }
+// Whether two listings are the same entries with the same records and texts.
+bool SameListing(const std::vector<Entry> &a, const std::vector<Entry> &b);
+// The whole table block as bytes (empty without a table): read-only calls keep it.
+std::vector<uint8_t> TableBytes(DAHandle doc);
+
+// Annotation text at the plain anchor of `anchor`: the units of the type-5 and
+// type-6 entries there in list order, a placeholder unit read as 0xFFFF.
+std::u16string AnchorText(const std::vector<Entry> &list, const ANPos &anchor);
+
+}  // namespace annofuzz
+
+#endif  // ANNO_FUZZ_SUPPORT_H
