@@ -192,7 +192,10 @@ void RunOnBoth(DAHandle small, DAHandle large, const Layout &layout, Scenario sc
     size_t added = 0;
     for (uint32_t rc : walked) added += rc == AN_OK ? 1 : 0;
     std::string codes;
-    for (uint32_t rc : walked) codes += " " + std::to_string(rc);
+    for (uint32_t rc : walked) {
+        codes += ' ';
+        codes += std::to_string(rc);
+    }
     EXPECT_GE(added + 2, walked.size()) << "the scenario adds what it means to:" << codes;
 }
 
