@@ -25,8 +25,13 @@
 #include "store/table.h"
 
 // Below this many entries a walk from the head is as quick as a search, and no index
-// memory is spent.
-constexpr uint16_t ANINDEX_MIN_ENTRIES = 256;
+// memory is spent. The fuzz build lowers it so that small generated tables are indexed
+// and every indexed walk is held against the brute-force readings.
+#ifndef ANNO_INDEX_MIN_ENTRIES
+#define ANNO_INDEX_MIN_ENTRIES 256
+#endif
+constexpr uint16_t ANINDEX_MIN_ENTRIES = ANNO_INDEX_MIN_ENTRIES;
+static_assert(ANINDEX_MIN_ENTRIES >= 1, "an empty table has nothing to index");
 
 // Header of the index block; six arrays of `capacity` slot indices follow it.
 struct ANEntryIndex {
