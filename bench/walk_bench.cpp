@@ -18,30 +18,11 @@
 #include "binding/instance.h"
 #include "hosts/modules.h"
 #include "store/table.h"
+#include "support/track_model.h"
 
 namespace annobench {
 
 namespace {
-
-// The tracking bit each annotation type is reported with.
-uint32_t TypeBit(uint16_t type) {
-    switch (type) {
-        case AN_TYPE_HILITE:
-            return ANTRACK_BIT_HILITE;
-        case AN_TYPE_POINT:
-            return ANTRACK_BIT_POINT;
-        case AN_TYPE_RANGE:
-            return ANTRACK_BIT_RANGE;
-        case AN_TYPE_VALUE:
-            return ANTRACK_BIT_VALUE;
-        case AN_TYPE_TEXT:
-            return ANTRACK_BIT_TEXT;
-        case AN_TYPE_CUTMARK:
-            return ANTRACK_BIT_CUTMARK;
-        default:
-            return 0;
-    }
-}
 
 const ANEntryTable *TableOf(DAHandle doc) {
     const auto *instance = static_cast<const ANInstance *>(antk::annoSlot(doc));
@@ -84,7 +65,7 @@ const PeerData &Peers(uint32_t positions, uint32_t count) {
             const uint64_t start = doc.Key(entry.record.start);
             const uint64_t end = doc.Key(entry.record.end);
             if (end <= start) continue;
-            data.intervals.push_back({start, end, TypeBit(entry.type)});
+            data.intervals.push_back({start, end, annotest::TrackBitOf(entry.type)});
         }
     }
     std::sort(

@@ -4,6 +4,7 @@
 #include <string>
 
 #include "anno/toolkit.h"
+#include "support/track_model.h"
 
 namespace annofuzz {
 
@@ -11,33 +12,6 @@ namespace {
 
 bool Covers(const ANAnnoRecord &r, const ANPos &p) {
     return Cmp(r.start, p) <= 0 && Cmp(p, r.end) < 0;
-}
-
-uint32_t BitOf(uint16_t type) {
-    switch (type) {
-        case AN_TYPE_HILITE:
-            return ANTRACK_BIT_HILITE;
-        case AN_TYPE_POINT:
-            return ANTRACK_BIT_POINT;
-        case AN_TYPE_RANGE:
-            return ANTRACK_BIT_RANGE;
-        case AN_TYPE_VALUE:
-            return ANTRACK_BIT_VALUE;
-        case AN_TYPE_TEXT:
-            return ANTRACK_BIT_TEXT;
-        case AN_TYPE_CUTMARK:
-            return ANTRACK_BIT_CUTMARK;
-        default:
-            return 0;
-    }
-}
-
-// Whether highlight `e` keeps out of the way of `h`, the one in force: it runs on
-// further from a lower slot, or has the very same extent.
-bool Yields(const Entry &e, const Entry &h) {
-    const int ends = Cmp(e.record.end, h.record.end);
-    if (ends > 0 && e.slot < h.slot) return true;
-    return ends == 0 && Cmp(e.record.start, h.record.start) == 0;
 }
 
 // The style output a style word gives: palette colours for a direct word, the
@@ -150,50 +124,27 @@ WalkCounts CheckTrackingWalk(DAHandle doc, const ANPos &start, const std::vector
         }
         ++counts.fullCalls;
 
-        uint32_t expectBits = (previousRange ? ANTRACK_BIT_RANGE : 0) |
-                              (previousMark ? ANTRACK_BIT_CUTMARK : 0) |
-                              (previousHilite ? ANTRACK_BIT_HILITE : 0);
-        uint64_t userData = before.userData;
+        annotest::CoverReading<Entry> seed;
+        seed.bits = (previousRange ? ANTRACK_BIT_RANGE : 0) |
+                    (previousMark ? ANTRACK_BIT_CUTMARK : 0) |
+                    (previousHilite ? ANTRACK_BIT_HILITE : 0);
+        seed.userData = before.userData;
         if (previousRange && before.cursor != AN_NONE) {
             CHECK(at[before.cursor] >= 0, "cursor " + N(before.cursor) + " names no entry");
-            userData = list[at[before.cursor]].record.userData;
+            seed.userData = list[at[before.cursor]].record.userData;
         }
-        uint64_t value = before.value;
-        const uint16_t *text = before.textBuffer;
-        uint32_t textLength = before.textLength;
-        bool range = false;
-        bool mark = false;
-        const Entry *hilite = nullptr;
-        for (uint16_t slot : cover) {
-            const Entry &e = list[at[slot]];
-            expectBits |= BitOf(e.type);
-            switch (e.type) {
-                case AN_TYPE_HILITE:
-                    if (hilite == nullptr || !Yields(e, *hilite)) {
-                        hilite = &e;
-                        userData = e.record.userData;
-                    }
-                    break;
-                case AN_TYPE_POINT:
-                case AN_TYPE_VALUE:
-                    value = e.record.value;
-                    break;
-                case AN_TYPE_RANGE:
-                    range = true;
-                    userData = e.record.userData;
-                    break;
-                case AN_TYPE_TEXT:
-                    userData = e.record.userData;
-                    text = e.record.textBuffer;
-                    textLength = e.record.textLength;
-                    break;
-                case AN_TYPE_CUTMARK:
-                    mark = true;
-                    break;
-                default:
-                    break;
-            }
-        }
+        seed.value = before.value;
+        seed.text = before.textBuffer;
+        seed.textLength = before.textLength;
+        const annotest::CoverReading<Entry> r = annotest::ReadCover(seed, cover, list, at);
+        const uint32_t expectBits = r.bits;
+        const uint64_t userData = r.userData;
+        const uint64_t value = r.value;
+        const uint16_t *text = r.text;
+        const uint32_t textLength = r.textLength;
+        const bool range = r.range;
+        const bool mark = r.mark;
+        const Entry *hilite = r.hilite;
         CHECK(bits == expectBits, "bits " + N(bits) + ", expected " + N(expectBits));
         CHECK(track.rangeActive == (range ? 1u : 0u), "rangeActive " + N(track.rangeActive));
         CHECK(track.markActive == (mark ? 1u : 0u), "markActive " + N(track.markActive));

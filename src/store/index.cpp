@@ -10,6 +10,23 @@
 
 namespace {
 
+// The first rank below `valid` from which `reached(rank)` holds (it holds from some
+// rank on, or nowhere), or `valid`: a binary search over the current ranks.
+template <typename Reached>
+uint32_t FirstRankWhere(uint32_t valid, Reached reached) {
+    uint32_t lo = 0;
+    uint32_t hi = valid;
+    while (lo < hi) {
+        const uint32_t mid = lo + (hi - lo) / 2;
+        if (reached(mid)) {
+            hi = mid;
+        } else {
+            lo = mid + 1;
+        }
+    }
+    return lo;
+}
+
 constexpr uint32_t kMaxCapacity = 65536;  // every 16-bit slot index
 constexpr uint32_t kCapacityStep = 16;    // capacities are multiples of this
 constexpr uint32_t kHeadroomDivisor = 8;  // room for an eighth more slots than needed
@@ -37,17 +54,7 @@ void Truncate(ANEntryIndex *index, uint32_t r) {
     if (r >= index->valid) return;
     const ANIndexArrays a = ANIndexArraysOf(index);
     // The text entries below `r` are a prefix of text[]: their ranks are current.
-    uint32_t lo = 0;
-    uint32_t hi = index->texts;
-    while (lo < hi) {
-        const uint32_t mid = lo + (hi - lo) / 2;
-        if (a.rank[a.text[mid]] < r) {
-            lo = mid + 1;
-        } else {
-            hi = mid;
-        }
-    }
-    index->texts = lo;
+    index->texts = FirstRankWhere(index->texts, [&](uint32_t k) { return a.rank[a.text[k]] >= r; });
     index->valid = r;
 }
 
@@ -171,49 +178,25 @@ void ANFreeIndex(ANInstance *instance) {
 uint32_t ANIndexRanksAtOrBefore(const ANEntryTable *table, const ANEntryIndex *index,
                                 const ANPos &pos) {
     const uint16_t *order = ANIndexArraysOf(index).order;
-    uint32_t lo = 0;
-    uint32_t hi = index->valid;
-    while (lo < hi) {
-        const uint32_t mid = lo + (hi - lo) / 2;
-        if (ANPosBefore(pos, ANSlot(table, order[mid]).record.start)) {
-            hi = mid;
-        } else {
-            lo = mid + 1;
-        }
-    }
-    return lo;
+    return FirstRankWhere(index->valid, [&](uint32_t r) {
+        return ANPosBefore(pos, ANSlot(table, order[r]).record.start);
+    });
 }
 
 uint32_t ANIndexRanksBefore(const ANEntryTable *table, const ANEntryIndex *index,
                             const ANPos &pos) {
     const uint16_t *order = ANIndexArraysOf(index).order;
-    uint32_t lo = 0;
-    uint32_t hi = index->valid;
-    while (lo < hi) {
-        const uint32_t mid = lo + (hi - lo) / 2;
-        if (ANPosBefore(ANSlot(table, order[mid]).record.start, pos)) {
-            lo = mid + 1;
-        } else {
-            hi = mid;
-        }
-    }
-    return lo;
+    return FirstRankWhere(index->valid, [&](uint32_t r) {
+        return !ANPosBefore(ANSlot(table, order[r]).record.start, pos);
+    });
 }
 
 uint32_t ANIndexFirstReaching(const ANEntryTable *table, const ANEntryIndex *index,
                               const ANPos &pos) {
     const uint16_t *far = ANIndexArraysOf(index).farAll;
-    uint32_t lo = 0;
-    uint32_t hi = index->valid;
-    while (lo < hi) {
-        const uint32_t mid = lo + (hi - lo) / 2;
-        if (far[mid] != AN_NONE && !ANPosBefore(ANSlot(table, far[mid]).record.end, pos)) {
-            hi = mid;
-        } else {
-            lo = mid + 1;
-        }
-    }
-    return lo;
+    return FirstRankWhere(index->valid, [&](uint32_t r) {
+        return far[r] != AN_NONE && !ANPosBefore(ANSlot(table, far[r]).record.end, pos);
+    });
 }
 
 uint16_t ANFirstEntryNotBefore(const ANInstance *instance, const ANPos &pos) {

@@ -16,6 +16,7 @@
 #include "styles/styles.h"
 #include "support/fixture.h"
 #include "support/invariants.h"
+#include "support/track_model.h"
 
 namespace tracktest {
 
@@ -50,33 +51,6 @@ inline ExpectedStyle StyleFor(DAHandle doc, uint32_t word) {
     s.attr1 = found.attr1;
     s.attr2 = found.attr2;
     return s;
-}
-
-inline uint32_t BitOf(uint16_t type) {
-    switch (type) {
-        case AN_TYPE_HILITE:
-            return ANTRACK_BIT_HILITE;
-        case AN_TYPE_POINT:
-            return ANTRACK_BIT_POINT;
-        case AN_TYPE_RANGE:
-            return ANTRACK_BIT_RANGE;
-        case AN_TYPE_VALUE:
-            return ANTRACK_BIT_VALUE;
-        case AN_TYPE_TEXT:
-            return ANTRACK_BIT_TEXT;
-        case AN_TYPE_CUTMARK:
-            return ANTRACK_BIT_CUTMARK;
-        default:
-            return 0;
-    }
-}
-
-// Whether highlight `e` yields to `h`, the one in force: a highlight that runs on
-// further from a lower slot, or one of the very same extent, keeps out of the way.
-inline bool Yields(const annotest::Listed &e, const annotest::Listed &h) {
-    const int ends = Cmp(e.record.end, h.record.end);
-    if (ends > 0 && e.slot < h.slot) return true;
-    return ends == 0 && Cmp(e.record.start, h.record.start) == 0;
 }
 
 struct WalkStats {
@@ -156,48 +130,27 @@ inline WalkStats CheckWalk(DAHandle doc, const ANPos &start, const std::vector<A
         ++stats.fullCalls;
 
         // Expected outputs, by walking the covering entries in list order.
-        uint32_t expectBits = (previousRange ? ANTRACK_BIT_RANGE : 0) |
-                              (previousMark ? ANTRACK_BIT_CUTMARK : 0) |
-                              (previousHilite ? ANTRACK_BIT_HILITE : 0);
-        uint64_t userData = before.userData;
+        annotest::CoverReading<annotest::Listed> seed;
+        seed.bits = (previousRange ? ANTRACK_BIT_RANGE : 0) |
+                    (previousMark ? ANTRACK_BIT_CUTMARK : 0) |
+                    (previousHilite ? ANTRACK_BIT_HILITE : 0);
+        seed.userData = before.userData;
         if (previousRange && before.cursor != AN_NONE) {
-            userData = list[listIndex[before.cursor]].record.userData;
+            seed.userData = list[listIndex[before.cursor]].record.userData;
         }
-        uint64_t value = before.value;
-        const uint16_t *text = before.textBuffer;
-        uint32_t textLength = before.textLength;
-        bool range = false, mark = false;
-        const annotest::Listed *hilite = nullptr;
-        for (uint16_t slot : cover) {
-            const annotest::Listed &e = list[listIndex[slot]];
-            expectBits |= BitOf(e.type);
-            switch (e.type) {
-                case AN_TYPE_HILITE:
-                    if (hilite == nullptr || !Yields(e, *hilite)) {
-                        hilite = &e;
-                        userData = e.record.userData;
-                    }
-                    break;
-                case AN_TYPE_POINT:
-                case AN_TYPE_VALUE:
-                    value = e.record.value;
-                    break;
-                case AN_TYPE_RANGE:
-                    range = true;
-                    userData = e.record.userData;
-                    break;
-                case AN_TYPE_TEXT:
-                    userData = e.record.userData;
-                    text = e.record.textBuffer;
-                    textLength = e.record.textLength;
-                    break;
-                case AN_TYPE_CUTMARK:
-                    mark = true;
-                    break;
-                default:
-                    break;
-            }
-        }
+        seed.value = before.value;
+        seed.text = before.textBuffer;
+        seed.textLength = before.textLength;
+        const annotest::CoverReading<annotest::Listed> r =
+            annotest::ReadCover(seed, cover, list, listIndex);
+        const uint32_t expectBits = r.bits;
+        const uint64_t userData = r.userData;
+        const uint64_t value = r.value;
+        const uint16_t *text = r.text;
+        const uint32_t textLength = r.textLength;
+        const bool range = r.range;
+        const bool mark = r.mark;
+        const annotest::Listed *hilite = r.hilite;
         if (bits != 0) ++stats.reports;
         EXPECT_EQ(bits, expectBits);
         EXPECT_EQ(track.rangeActive, range ? 1u : 0u);
