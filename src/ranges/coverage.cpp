@@ -17,8 +17,8 @@ uint32_t ANPosCovered(const ANInstance *instance, const ANPos &pos, bool marks) 
         const uint32_t met = ANIndexRanksAtOrBefore(table, index, pos);
         if (met == 0) return 0;
         const ANIndexArrays arrays = ANIndexArraysOf(index);
-        const uint16_t far = marks ? arrays.farCover[met - 1] : arrays.farRange[met - 1];
-        return far != AN_NONE && ANPosBefore(pos, ANSlot(table, far).record.end) ? 1 : 0;
+        const uint16_t farthest = marks ? arrays.farCover[met - 1] : arrays.farRange[met - 1];
+        return farthest != AN_NONE && ANPosBefore(pos, ANSlot(table, farthest).record.end) ? 1 : 0;
     }
     for (uint16_t i = table->first; i != AN_NONE; i = ANSlot(table, i).next) {
         const ANEntry &entry = ANSlot(table, i);

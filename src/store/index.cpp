@@ -193,9 +193,9 @@ uint32_t ANIndexRanksBefore(const ANEntryTable *table, const ANEntryIndex *index
 
 uint32_t ANIndexFirstReaching(const ANEntryTable *table, const ANEntryIndex *index,
                               const ANPos &pos) {
-    const uint16_t *far = ANIndexArraysOf(index).farAll;
+    const uint16_t *farthest = ANIndexArraysOf(index).farAll;
     return FirstRankWhere(index->valid, [&](uint32_t r) {
-        return far[r] != AN_NONE && !ANPosBefore(ANSlot(table, far[r]).record.end, pos);
+        return farthest[r] != AN_NONE && !ANPosBefore(ANSlot(table, farthest[r]).record.end, pos);
     });
 }
 
