@@ -354,16 +354,16 @@ AnnotationSet parseAnnotations(std::string_view text, const std::string &source)
         uint32_t number = 0;
         std::map<uint32_t, uint32_t> tags;  // tag -> the annotation that has it
         for (const Json &anno : top.array("annotations")) {
-            AnnoSpec spec = readAnnotation(anno, ++number, source);
-            const auto [it, fresh] = tags.emplace(spec.tag, spec.number);
+            AnnoSpec parsed = readAnnotation(anno, ++number, source);
+            const auto [it, fresh] = tags.emplace(parsed.tag, parsed.number);
             if (!fresh) {
                 const bool given = anno.contains("tag");
                 throw Failure(source + ": annotation " + std::to_string(number) + ": tag " +
-                              std::to_string(spec.tag) +
+                              std::to_string(parsed.tag) +
                               (given ? "" : " (its number, the default)") +
                               " is already used by annotation " + std::to_string(it->second));
             }
-            set.annotations.push_back(std::move(spec));
+            set.annotations.push_back(std::move(parsed));
         }
     }
     for (const AnnoSpec &anno : set.annotations) {

@@ -294,27 +294,27 @@ void Session::add(const AnnotationSet &set, const std::string &source) {
     }
 }
 
-void Session::addStyle(const StyleSpec &spec, const std::string &source) {
+void Session::addStyle(const StyleSpec &parsed, const std::string &source) {
     ANHiliteStyle style{};
     style.size = ANHILITESTYLE_SIZE;
-    style.styleId = spec.id;
-    if (spec.foreground) {
+    style.styleId = parsed.id;
+    if (parsed.foreground) {
         style.flags |= ANSTYLE_COLOR1;
-        style.color1 = *spec.foreground;
+        style.color1 = *parsed.foreground;
     }
-    if (spec.background) {
+    if (parsed.background) {
         style.flags |= ANSTYLE_COLOR2;
-        style.color2 = *spec.background;
+        style.color2 = *parsed.background;
     }
-    if (spec.bold || spec.italic) {
+    if (parsed.bold || parsed.italic) {
         style.flags |= ANSTYLE_ATTR;
         style.attr1 =
-            static_cast<uint16_t>((spec.bold ? kAttrBold : 0) | (spec.italic ? kAttrItalic : 0));
+            static_cast<uint16_t>((parsed.bold ? kAttrBold : 0) | (parsed.italic ? kAttrItalic : 0));
     }
-    const uint32_t result = spec.global ? ANAddGlobalHiliteStyle(globalStyles_.get(), &style)
+    const uint32_t result = parsed.global ? ANAddGlobalHiliteStyle(globalStyles_.get(), &style)
                                         : ANAddHiliteStyle(doc_.get(), &style);
     if (result != AN_OK) {
-        throw Failure(source + ": style " + std::to_string(spec.number) +
+        throw Failure(source + ": style " + std::to_string(parsed.number) +
                       ": the library did not add it: " + describeResult(result));
     }
 }
