@@ -19,12 +19,8 @@
 
 #include "anno/anno.h"
 #include "anno/toolkit.h"
-#include "binding/instance.h"
 #include "fuzz_support.h"
-#include "hosts/platform.h"
 #include "oracles.h"
-#include "store/table.h"
-#include "support/table_rules.h"
 
 #if !defined(_WIN32)
 #include "anno/winapi_test.h"
@@ -36,6 +32,7 @@
 namespace annofuzz {
 
 uint64_t apiCalls = 0;
+Settings settings;
 
 namespace {
 
@@ -65,28 +62,6 @@ void Fail(const std::string &what) {
 
 std::string Text(const ANPos &pos) { return annotest::PosText(pos); }
 
-const ANEntryTable *TableOf(DAHandle doc) {
-    const auto *instance = static_cast<const ANInstance *>(antk::annoSlot(doc));
-    return instance == nullptr ? nullptr : instance->entries;
-}
-
-std::vector<Entry> ListEntries(DAHandle doc) {
-    std::vector<Entry> out;
-    const ANEntryTable *table = TableOf(doc);
-    if (table == nullptr) return out;
-    for (uint16_t i = table->first; i != AN_NONE && out.size() <= table->capacity;
-         i = ANSlot(table, i).next) {
-        const ANEntry &e = ANSlot(table, i);
-        Entry entry{i, e.type, e.flags, e.record, {}};
-        if (e.type == AN_TYPE_TEXT && e.record.textBuffer != nullptr) {
-            entry.text.assign(reinterpret_cast<const char16_t *>(e.record.textBuffer),
-                              e.record.textLength);
-        }
-        out.push_back(entry);
-    }
-    return out;
-}
-
 SlotIndex::SlotIndex(const std::vector<Entry> &list) {
     for (size_t i = 0; i < list.size(); ++i) {
         if (list[i].slot >= at_.size()) at_.resize(list[i].slot + 1u, -1);
@@ -103,23 +78,6 @@ bool SameListing(const std::vector<Entry> &a, const std::vector<Entry> &b) {
         }
     }
     return true;
-}
-
-std::vector<uint8_t> TableBytes(DAHandle doc) {
-    const ANEntryTable *table = TableOf(doc);
-    if (table == nullptr) return {};
-    const auto *bytes = reinterpret_cast<const uint8_t *>(table);
-    return std::vector<uint8_t>(bytes, bytes + ANTableBytes(table->capacity));
-}
-
-std::u16string AnchorText(const std::vector<Entry> &list, const ANPos &anchor) {
-    std::u16string text;
-    for (const Entry &e : list) {
-        if (!SameAnchor(e.record.start, anchor)) continue;
-        if (e.type == AN_TYPE_TEXT) text += e.text;
-        if (e.type == AN_TYPE_PLACEHOLDER) text += u'\xFFFF';
-    }
-    return text;
 }
 
 namespace {
@@ -348,6 +306,7 @@ class Run {
     void Lifecycle(Document &d);
     void Stale(Document &d);
     void ArmFailure();
+    void Fill(Document &d);
     void Finish();
 
     uint64_t NewBlock(Document &d);
@@ -381,7 +340,7 @@ void Run::CheckRules(const char *when) {
 // Every entry that owns a userData block holds one this document was given.
 void Run::CheckOwnership(Document &d) {
     for (const Entry &e : ListEntries(d.handle)) {
-        if ((e.flags & ANENTRY_OWNS_USERDATA) == 0 || e.record.userData == 0) continue;
+        if (!e.ownsUserData || e.record.userData == 0) continue;
         CHECK(e.type == AN_TYPE_HILITE || e.type == AN_TYPE_RANGE || e.type == AN_TYPE_TEXT,
               "a type-" + N(e.type) + " entry owns a userData block");
         CHECK(d.blocks.count(e.record.userData) != 0, "slot " + N(e.slot) + " owns userData " +
@@ -398,9 +357,8 @@ uint64_t Run::NewBlock(Document &d) {
         std::advance(it, in_.below(d.blocks.size()));
         return *it;
     }
-    void *block = HeapAlloc(GetProcessHeap(), 0, 8 + in_.below(24));
-    if (block == nullptr) return 0;
-    const auto value = static_cast<uint64_t>(reinterpret_cast<uintptr_t>(block));
+    const uint64_t value = annotest::NewHeapBlock(8 + in_.below(24));
+    if (value == 0) return 0;
     d.blocks.insert(value);
     return value;
 }
@@ -449,9 +407,11 @@ void Run::Go() {
         d->staleTextStarted = CALL(ANStartAnnoTextTrack(d->handle, &d->staleText)) == 0;
         std::memset(&d->stale, 0, sizeof d->stale);
     }
+    Fill(a_);
+    if (settings.arm) settings.arm();
 
     for (uint32_t ops = 0; !in_.done() && ops < 64; ++ops) {
-        faulty_ = armNext_;
+        faulty_ = armNext_ || settings.sweep;
         armNext_ = false;
         if (faulty_) {
 #if ANNO_FUZZ_PLATFORM_CONTROLS
@@ -717,7 +677,7 @@ void Run::Clear(Document &d) {
         return;
     }
     if (before.empty()) {
-        CHECK(rc == 0 && notes.empty() && TableOf(d.handle) == nullptr, "clearing nothing");
+        CHECK(rc == 0 && notes.empty() && !HasTable(d.handle), "clearing nothing");
         return;
     }
     size_t chosen = 0;
@@ -738,7 +698,7 @@ void Run::Clear(Document &d) {
     } else {
         CHECK(rc == 0 && notes.empty(), "clearing without a callback gave " + N(rc));
     }
-    if (after.empty()) CHECK(TableOf(d.handle) == nullptr, "an emptied table was kept");
+    if (after.empty()) CHECK(!HasTable(d.handle), "an emptied table was kept");
     // The annotation text at every anchor loses exactly the units of the removed texts.
     std::vector<ANPos> anchors;
     for (const Entry &e : before) {
@@ -761,13 +721,13 @@ void Run::ClearUserData(Document &d) {
     trail.back() += ": clear userData";
     std::set<uint64_t> owned;
     for (const Entry &e : ListEntries(d.handle)) {
-        if ((e.flags & ANENTRY_OWNS_USERDATA) != 0 && e.record.userData != 0)
+        if (e.ownsUserData && e.record.userData != 0)
             owned.insert(e.record.userData);
     }
     const uint32_t rc = CALL(ANClearUserData(d.handle));
     std::set<uint64_t> still;
     for (const Entry &e : ListEntries(d.handle)) {
-        if ((e.flags & ANENTRY_OWNS_USERDATA) != 0 && e.record.userData != 0)
+        if (e.ownsUserData && e.record.userData != 0)
             still.insert(e.record.userData);
     }
     for (uint64_t block : owned) {
@@ -900,14 +860,13 @@ void Run::Event(Document &d) {
         entry = static_cast<uint16_t>(in_.below(40));
     }
     trail.back() += ": event " + N(event) + " from slot " + N(entry) + " at " + Text(pos);
-    const auto *instance = static_cast<const ANInstance *>(antk::annoSlot(d.handle));
-    const uint16_t hoverEntry = instance != nullptr ? instance->hoverEntry : AN_NONE;
-    const ANPos hoverPos = instance != nullptr ? instance->hoverPos : ANPos{};
+    ANPos hoverPos{};
+    const uint16_t hoverEntry = annotest::HoverEntry(d.handle, &hoverPos);
     const std::vector<uint8_t> bytes = TableBytes(d.handle);
     const uint32_t rc = CALL(ANAnnoEvent(d.handle, event, entry, &pos));
     CHECK(bytes == TableBytes(d.handle), "an event changed the table");
     if (faulty_) return;
-    if (instance == nullptr) {
+    if (!Bound(d)) {
         CHECK(rc == 0 && d.recorder.notes.empty(), "an event without state");
         return;
     }
@@ -915,13 +874,11 @@ void Run::Event(Document &d) {
     const bool live = entry == AN_NONE || ListIndex(list)[entry] >= 0;
     const bool moved = !list.empty() && live && event == ANEVENT_MOVE &&
                        !(entry == AN_NONE && hoverEntry == AN_NONE);
-    if (moved) {
-        CHECK(instance->hoverEntry == entry && Same(instance->hoverPos, pos),
-              "hover state after a move");
-    } else {
-        CHECK(instance->hoverEntry == hoverEntry && Same(instance->hoverPos, hoverPos),
-              "hover state changed without a move");
-    }
+    ANPos hoverAfter{};
+    const uint16_t entryAfter = annotest::HoverEntry(d.handle, &hoverAfter);
+    CHECK(moved ? entryAfter == entry && Same(hoverAfter, pos)
+                : entryAfter == hoverEntry && Same(hoverAfter, hoverPos),
+          "hover state after the event");
 }
 
 void Run::Find(Document &d) {
@@ -1182,14 +1139,12 @@ void Run::Build(Document &d) {
               "a built annotation's notification");
     }
     if (faulty_) return;
-    const auto *instance = static_cast<const ANInstance *>(antk::annoSlot(d.handle));
-    if (instance == nullptr) {
+    if (!Bound(d)) {
         CHECK(rc == AN_ERR_NOSTATE, "building without state gave " + N(rc));
         return;
     }
     CHECK(rc == 0, "building gave " + N(rc));
-    CHECK(instance->buildCursor == d.ranges,
-          "buildCursor " + N(instance->buildCursor) + " of " + N(d.ranges));
+    CHECK(annotest::BuildCursor(d.handle) == d.ranges, "buildCursor after building");
 }
 
 // ---- Positions
@@ -1415,7 +1370,41 @@ void Run::ArmFailure() {
     }
 }
 
+void Run::Fill(Document &d) {
+    // Every type but ranges (whose splitting would make the count unpredictable), spread
+    // over the document by a fixed sequence, so the table has `fillers` entries.
+    uint32_t seed = 12345;
+    for (uint32_t i = 0; i < settings.fillers && Bound(d); ++i) {
+        seed = seed * 1103515245u + 12345u;
+        ANPos at = d.content[(seed >> 8) % d.content.size()];
+        const ANPos to = d.content[(seed >> 16) % d.content.size()];
+        ANAnnoRecord r{};
+        r.size = AN_RECORD_SIZE_POINT;
+        r.tag = 0x100 + i % 8;
+        r.start = Cmp(at, to) <= 0 ? at : to;
+        r.end = Cmp(at, to) <= 0 ? to : at;
+        r.value = i;
+        r.style = 0x40000000u | (1 + i % 10);
+        uint16_t type = static_cast<uint16_t>(1 + i % 7);
+        const uint16_t unit = static_cast<uint16_t>('a' + i % 26);
+        if (type == AN_TYPE_RANGE) type = AN_TYPE_HILITE;
+        if (type == AN_TYPE_TEXT) {
+            r.size = 48;
+            ANTextDesc t{48, r.tag, at, 0, &unit, 1, 0};
+            CALL(ANAddAnno(d.handle, type, &t));
+            continue;
+        }
+        if (type == AN_TYPE_PLACEHOLDER || type == AN_TYPE_CUTMARK) {
+            ANPointDesc p{32, r.tag, r.start, 0};
+            CHECK(CALL(ANAddAnno(d.handle, type, &p)) == 0, "adding a filler mark");
+            continue;
+        }
+        CHECK(CALL(ANAddAnno(d.handle, type, &r)) == 0, "adding a filler");
+    }
+}
+
 void Run::Finish() {
+    if (settings.disarm) settings.disarm();
     SetContext("finishing the input");
     trail.push_back("finish");
     antk::clearFailures();
@@ -1431,7 +1420,7 @@ void Run::Finish() {
             CHECK(CALL(ANDeInit(d->handle)) == 0, "ANDeInit");
         }
         for (uint64_t block : d->blocks)
-            HeapFree(GetProcessHeap(), 0, reinterpret_cast<void *>(block));
+            annotest::FreeHeapBlock(block);
         d->blocks.clear();
     }
     CHECK(antk::openSecondaryDocuments() == 0 && antk::openContents() == 0, "content left open");
@@ -1451,10 +1440,14 @@ void Run::Finish() {
 
 }  // namespace annofuzz
 
-extern "C" int LLVMFuzzerTestOneInput(const uint8_t *data, size_t size) {
-    annofuzz::Input in(data, size);
-    annofuzz::Run run(in);
+void annofuzz::RunInput(const uint8_t *data, size_t size) {
+    Input in(data, size);
+    Run run(in);
     run.Go();
+}
+
+extern "C" int LLVMFuzzerTestOneInput(const uint8_t *data, size_t size) {
+    annofuzz::RunInput(data, size);
     // A line per million calls, so that a long run shows its progress in its log.
     static uint64_t reported = 0;
     if (annofuzz::apiCalls / 1000000 > reported) {

@@ -6,11 +6,12 @@
 
 #include <cstddef>
 #include <cstdint>
+#include <functional>
 #include <string>
 #include <vector>
 
 #include "anno/anno.h"
-#include "store/table.h"
+#include "support/table_view.h"
 
 namespace annofuzz {
 
@@ -64,18 +65,13 @@ inline bool SameAnchor(const ANPos &a, const ANPos &b) {
 }
 std::string Text(const ANPos &pos);
 
-// One entry of the ordered list, copied out.
-struct Entry {
-    uint16_t slot;
-    uint16_t type;
-    uint16_t flags;
-    ANAnnoRecord record;
-    std::u16string text;  // type 5: its units
-};
+// The one view of the table (tests/support/table_view.h).
+using annotest::AnchorText;
+using annotest::Entry;
+using annotest::HasTable;
+using annotest::ListEntries;
+using annotest::TableBytes;
 
-// The table of a document (null without state or table) and its entries in list order.
-const ANEntryTable *TableOf(DAHandle doc);
-std::vector<Entry> ListEntries(DAHandle doc);
 // Index of each slot in a listing, -1 for slots not listed.
 class SlotIndex {
  public:
@@ -88,12 +84,24 @@ class SlotIndex {
 inline SlotIndex ListIndex(const std::vector<Entry> &list) { return SlotIndex(list); }
 // Whether two listings are the same entries with the same records and texts.
 bool SameListing(const std::vector<Entry> &a, const std::vector<Entry> &b);
-// The whole table block as bytes (empty without a table): read-only calls keep it.
-std::vector<uint8_t> TableBytes(DAHandle doc);
 
-// Annotation text at the plain anchor of `anchor`: the units of the type-5 and
-// type-6 entries there in list order, a placeholder unit read as 0xFFFF.
-std::u16string AnchorText(const std::vector<Entry> &list, const ANPos &anchor);
+
+// How the runs of one process decode their inputs (the fuzzer keeps the defaults).
+struct Settings {
+    // Entries added to the first document before the operations, so that its table is
+    // large enough for the lookup index of every build.
+    uint32_t fillers = 0;
+    // Every operation runs as if a failure were armed: the sweeps arm their own.
+    bool sweep = false;
+    // Called once the documents are made and bound, before the first operation.
+    std::function<void()> arm;
+    // Called when the operations are over, before the input's state is released.
+    std::function<void()> disarm;
+};
+extern Settings settings;
+
+// Decodes and runs one input; aborts with a report on the first broken expectation.
+void RunInput(const uint8_t *data, size_t size);
 
 }  // namespace annofuzz
 

@@ -1,6 +1,9 @@
 #include "support/fixture.h"
 
+#include <cstring>
 #include <ostream>
+
+#include "support/table_view.h"
 
 namespace annotest {
 
@@ -26,6 +29,7 @@ void LeakCheckedTest::TearDown() {
 Doc::~Doc() {
     if (handle_ == nullptr) return;
     antk::clearFailures();
+    EXPECT_EQ(DocumentRulesBroken(handle_), "");
     ANDeInit(handle_);
     antk::destroyDocument(handle_);
 }
@@ -36,17 +40,86 @@ DAHandle PlainDocument(uint32_t count) {
     return builder.build();
 }
 
+uint32_t AddHilite(DAHandle doc, const ANPos &start, const ANPos &end, uint32_t tag, uint32_t style,
+                   uint64_t userData, uint32_t eventMask, uint64_t value) {
+    ANAnnoRecord d{};
+    d.size = AN_RECORD_SIZE_POINT;
+    d.tag = tag;
+    d.start = start;
+    d.end = end;
+    d.eventMask = eventMask;
+    d.userData = userData;
+    d.value = value;
+    d.style = style;
+    return ANAddAnno(doc, AN_TYPE_HILITE, &d);
+}
+
+uint32_t AddPoint(DAHandle doc, const ANPos &pos, uint32_t tag, uint64_t value, uint16_t type,
+                  uint32_t eventMask, uint64_t userData) {
+    ANAnnoRecord d{};
+    d.size = AN_RECORD_SIZE_POINT;
+    d.tag = tag;
+    d.start = pos;
+    d.end = pos;
+    d.eventMask = eventMask;
+    d.userData = userData;
+    d.value = value;
+    return ANAddAnno(doc, type, &d);
+}
+
+uint32_t AddRange(DAHandle doc, const ANPos &start, const ANPos &end, uint32_t tag,
+                  uint64_t userData) {
+    ANRangeDesc d{};
+    d.size = sizeof(d);
+    d.tag = tag;
+    d.start = start;
+    d.end = end;
+    d.userData = userData;
+    return ANAddAnno(doc, AN_TYPE_RANGE, &d);
+}
+
+uint32_t AddText(DAHandle doc, const ANPos &pos, std::u16string_view text, uint32_t tag,
+                 uint64_t userData) {
+    ANTextDesc d{};
+    d.size = sizeof(d);
+    d.tag = tag;
+    d.pos = pos;
+    d.userData = userData;
+    d.text = reinterpret_cast<const uint16_t *>(text.data());
+    d.textLength = static_cast<uint32_t>(text.size());
+    return ANAddAnno(doc, AN_TYPE_TEXT, &d);
+}
+
+uint32_t AddMark(DAHandle doc, uint16_t type, const ANPos &pos, uint32_t tag, uint64_t userData) {
+    ANPointDesc d{};
+    d.size = sizeof(d);
+    d.tag = tag;
+    d.pos = pos;
+    d.userData = userData;
+    return ANAddAnno(doc, type, &d);
+}
+
+uint32_t Notifications::Callback(uint16_t code, uint16_t detail, void *record, void *self) {
+    auto *me = static_cast<Notifications *>(self);
+    Notification n{};
+    n.code = code;
+    n.detail = detail;
+    if (record != nullptr) {
+        if (code == ANNOTIFY_EVENT) {
+            std::memcpy(&n.event, record, sizeof(n.event));
+        } else {
+            std::memcpy(&n.record, record, sizeof(n.record));
+        }
+    }
+    me->calls.push_back(n);
+    return me->result;
+}
+
+void Notifications::Attach(DAHandle doc) { ANSetCallback(doc, &Notifications::Callback, this); }
+
 }  // namespace annotest
 
-void PrintTo(const ANPos &pos, std::ostream *os) {
-    *os << "(" << pos.itemId << ", ";
-    if (pos.subItemId == ANPOS_NOSUBITEM) {
-        *os << "-";
-    } else {
-        *os << pos.subItemId;
-    }
-    *os << ", " << pos.kind << ", " << pos.textIndex << ")";
-}
+void PrintTo(const ANPos &pos, std::ostream *os) { *os << annotest::PosText(pos); }
 
 bool operator==(const ANPos &a, const ANPos &b) {
     return a.itemId == b.itemId && a.subItemId == b.subItemId && a.kind == b.kind &&

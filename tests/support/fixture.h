@@ -1,12 +1,15 @@
 // What every test of the library shares: a fixture that fails a test which leaks a
-// heap or global-memory block or leaves an injected failure armed, and a document
-// handle that releases itself.
+// heap or global-memory block or leaves an injected failure armed, documents that
+// release themselves, adding each annotation type in its largest descriptor form, and
+// a callback that records what it hears.
 #ifndef ANNO_TESTS_FIXTURE_H
 #define ANNO_TESTS_FIXTURE_H
 
 #include <gtest/gtest.h>
 
 #include <cstdint>
+#include <string_view>
+#include <vector>
 
 #include "anno/anno.h"
 #include "anno/toolkit.h"
@@ -40,6 +43,10 @@ class LeakCheckedTest : public ::testing::Test {
     int64_t globalAtStart_ = 0;
 };
 
+// The same for value-parameterised tests.
+template <typename Row>
+class LeakCheckedRows : public LeakCheckedTest, public ::testing::WithParamInterface<Row> {};
+
 // A toolkit document, destroyed (after ANDeInit) when it goes out of scope.
 class Doc {
  public:
@@ -64,6 +71,39 @@ inline ANPos Pos(uint32_t item, uint32_t sub = ANPOS_NOSUBITEM, uint32_t kind = 
 inline ANPos TextPos(uint32_t item, uint32_t sub, uint32_t index) {
     return ANPos{item, sub, ANPOS_ANNOTEXT, index};
 }
+
+// Each adds one annotation through ANAddAnno in the type's largest descriptor form
+// and returns ANAddAnno's result.
+uint32_t AddHilite(DAHandle doc, const ANPos &start, const ANPos &end, uint32_t tag = 1,
+                   uint32_t style = 0, uint64_t userData = 0, uint32_t eventMask = 0,
+                   uint64_t value = 0);
+// Type 2 (or 4 with `type`): a point at `pos`.
+uint32_t AddPoint(DAHandle doc, const ANPos &pos, uint32_t tag = 1, uint64_t value = 0,
+                  uint16_t type = AN_TYPE_POINT, uint32_t eventMask = 0, uint64_t userData = 0);
+uint32_t AddRange(DAHandle doc, const ANPos &start, const ANPos &end, uint32_t tag = 1,
+                  uint64_t userData = 0);
+uint32_t AddText(DAHandle doc, const ANPos &pos, std::u16string_view text, uint32_t tag = 1,
+                 uint64_t userData = 0);
+// Types 6 and 7.
+uint32_t AddMark(DAHandle doc, uint16_t type, const ANPos &pos, uint32_t tag = 1,
+                 uint64_t userData = 0);
+
+// One call of the notification callback, with a copy of the record it was given.
+struct Notification {
+    uint16_t code;
+    uint16_t detail;
+    ANAnnoRecord record;  // codes 1 and 2
+    ANEventRec event;     // code 3
+};
+
+// Records every notification; Attach installs it as the document's callback.
+struct Notifications {
+    std::vector<Notification> calls;
+    uint32_t result = 0;  // what the callback returns
+
+    static uint32_t Callback(uint16_t code, uint16_t detail, void *record, void *self);
+    void Attach(DAHandle doc);
+};
 
 }  // namespace annotest
 

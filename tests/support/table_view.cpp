@@ -1,0 +1,163 @@
+#include "support/table_view.h"
+
+#include <cstdio>
+#include <cstring>
+
+#include "anno/toolkit.h"
+#include "binding/instance.h"
+#include "hosts/platform.h"
+#include "store/table.h"
+
+namespace annotest {
+
+namespace {
+
+const ANInstance *InstanceOf(DAHandle doc) {
+    return static_cast<const ANInstance *>(antk::annoSlot(doc));
+}
+
+const ANEntryTable *TableOf(DAHandle doc) {
+    const ANInstance *instance = InstanceOf(doc);
+    return instance == nullptr ? nullptr : instance->entries;
+}
+
+// Walks one list from `head`, marking its slots in `seen` with `mark`; checks the
+// links and that it ends at `tail`. Empty on success.
+std::string WalkList(const ANEntryTable *t, uint16_t head, uint16_t tail, int mark,
+                     const char *name, std::vector<int> &seen, uint32_t *length) {
+    uint16_t before = AN_NONE;
+    *length = 0;
+    for (uint16_t i = head; i != AN_NONE; i = ANSlot(t, i).next) {
+        const std::string slot = std::string(name) + ": slot " + std::to_string(i);
+        if (i >= t->capacity) return slot + " out of range";
+        if (seen[i] != 0) return slot + " met twice or in both lists";
+        seen[i] = mark;
+        if (ANSlot(t, i).prev != before) return slot + " has a wrong prev link";
+        before = i;
+        ++*length;
+    }
+    if (before != tail) return std::string(name) + ": its tail field is wrong";
+    return {};
+}
+
+std::string TableRulesBroken(const ANEntryTable *t) {
+    const uint32_t capacity = t->capacity;
+    if (capacity == 0 || capacity % ANTABLE_GROWTH != 0 || capacity > ANTABLE_MAX_CAPACITY) {
+        return "capacity " + std::to_string(capacity);
+    }
+    std::vector<int> seen(capacity, 0);
+    uint32_t listed = 0;
+    uint32_t free = 0;
+    std::string why = WalkList(t, t->first, t->last, 1, "ordered list", seen, &listed);
+    if (why.empty()) why = WalkList(t, t->freeFirst, t->freeLast, 2, "free list", seen, &free);
+    if (!why.empty()) return why;
+    if (listed + free != capacity) return "the lists do not cover every slot";
+    if (t->count != listed) return "count " + std::to_string(t->count) + " is not the list's length";
+    if (free == 0) return "no free slot left";
+    if (t->full != 0 && free != 1) return "full set with " + std::to_string(free) + " free slots";
+    bool text = false;
+    const ANEntry *before = nullptr;
+    for (uint16_t i = t->first; i != AN_NONE; i = ANSlot(t, i).next) {
+        const ANEntry &e = ANSlot(t, i);
+        const std::string slot = "slot " + std::to_string(i) + " (type " + std::to_string(e.type) + ")";
+        if (e.type < AN_TYPE_HILITE || e.type > AN_TYPE_CUTMARK) return slot + " has a bad type";
+        if (ANCompPos(&e.record.start, &e.record.end) > 0) return slot + " starts after its end";
+        if (before != nullptr && ANCompPos(&e.record.start, &before->record.start) < 0) {
+            return slot + " starts at " + PosText(e.record.start) + ", before the entry ahead";
+        }
+        text |= e.type == AN_TYPE_TEXT || e.type == AN_TYPE_PLACEHOLDER;
+        const ANAnnoRecord &r = e.record;
+        if (e.type == AN_TYPE_TEXT && (r.textBuffer == nullptr || r.textCapacity <= r.textLength ||
+                                       r.text != nullptr)) {
+            return slot + " does not own a text buffer longer than its text";
+        }
+        before = &e;
+    }
+    if (text && t->hasText == 0) return "hasText not set";
+    return {};
+}
+
+}  // namespace
+
+std::vector<Entry> ListEntries(DAHandle doc) {
+    std::vector<Entry> out;
+    const ANEntryTable *table = TableOf(doc);
+    if (table == nullptr) return out;
+    uint32_t steps = 0;
+    for (uint16_t i = table->first; i != AN_NONE && steps <= table->capacity;
+         i = ANSlot(table, i).next, ++steps) {
+        const ANEntry &e = ANSlot(table, i);
+        Entry entry{i, e.type, (e.flags & ANENTRY_OWNS_USERDATA) != 0, e.record, {}};
+        if (e.type == AN_TYPE_TEXT && e.record.textBuffer != nullptr) {
+            entry.text.assign(reinterpret_cast<const char16_t *>(e.record.textBuffer),
+                              e.record.textLength);
+        }
+        out.push_back(entry);
+    }
+    return out;
+}
+
+bool HasTable(DAHandle doc) { return TableOf(doc) != nullptr; }
+
+std::vector<uint8_t> TableBytes(DAHandle doc) {
+    const ANEntryTable *table = TableOf(doc);
+    if (table == nullptr) return {};
+    const auto *bytes = reinterpret_cast<const uint8_t *>(table);
+    return std::vector<uint8_t>(bytes, bytes + ANTableBytes(table->capacity));
+}
+
+uint16_t HoverEntry(DAHandle doc, ANPos *pos) {
+    const ANInstance *instance = InstanceOf(doc);
+    *pos = instance != nullptr ? instance->hoverPos : ANPos{};
+    return instance != nullptr ? instance->hoverEntry : AN_NONE;
+}
+
+uint32_t BuildCursor(DAHandle doc) {
+    const ANInstance *instance = InstanceOf(doc);
+    return instance != nullptr ? instance->buildCursor : 0;
+}
+
+std::string DocumentRulesBroken(DAHandle doc) {
+    const ANInstance *instance = InstanceOf(doc);
+    if (instance == nullptr) return {};
+    const ANEntryTable *t = instance->entries;
+    if (t != nullptr) {
+        std::string why = TableRulesBroken(t);
+        if (!why.empty()) return why;
+    }
+    if (instance->hoverEntry == AN_NONE) return {};
+    for (const Entry &e : ListEntries(doc)) {
+        if (e.slot == instance->hoverEntry) return {};
+    }
+    return "hover entry " + std::to_string(instance->hoverEntry) + " is not listed";
+}
+
+std::u16string AnchorText(const std::vector<Entry> &list, const ANPos &anchor,
+                          char16_t placeholder) {
+    std::u16string text;
+    for (const Entry &e : list) {
+        if (e.record.start.itemId != anchor.itemId || e.record.start.subItemId != anchor.subItemId)
+            continue;
+        if (e.type == AN_TYPE_TEXT) text += e.text;
+        if (e.type == AN_TYPE_PLACEHOLDER) text += placeholder;
+    }
+    return text;
+}
+
+uint64_t NewHeapBlock(size_t bytes) {
+    return static_cast<uint64_t>(reinterpret_cast<uintptr_t>(HeapAlloc(GetProcessHeap(), 0, bytes)));
+}
+
+void FreeHeapBlock(uint64_t block) {
+    HeapFree(GetProcessHeap(), 0, reinterpret_cast<void *>(static_cast<uintptr_t>(block)));
+}
+
+std::string PosText(const ANPos &pos) {
+    char sub[16] = "-";
+    if (pos.subItemId != ANPOS_NOSUBITEM) std::snprintf(sub, sizeof sub, "%u", pos.subItemId);
+    char out[64];
+    std::snprintf(out, sizeof out, "(%u, %s, %u, %u)", pos.itemId, sub, pos.kind, pos.textIndex);
+    return out;
+}
+
+}  // namespace annotest

@@ -1,0 +1,66 @@
+// The one place where tests look at a document's annotation table from inside: the
+// table's rules, checked after every operation, and a plain listing of the ordered
+// list that the brute-force readings work from. Nothing else in the tests knows how
+// the table is laid out, so this file alone follows a redesign of the insides.
+// Framework-free, so that the GoogleTest suites and the fuzz target share it.
+#ifndef ANNO_TESTS_TABLE_VIEW_H
+#define ANNO_TESTS_TABLE_VIEW_H
+
+#include <cstddef>
+#include <cstdint>
+#include <string>
+#include <vector>
+
+#include "anno/anno.h"
+
+namespace annotest {
+
+// One entry of the ordered list, copied out. `slot` is the number tracking and
+// events hand out for it.
+struct Entry {
+    uint16_t slot;
+    uint16_t type;
+    bool ownsUserData;  // userData is a caller's heap block that ANClearUserData frees
+    ANAnnoRecord record;
+    std::u16string text;  // type 5: its units
+};
+
+// The entries of the ordered list, first to last (empty without state or table).
+std::vector<Entry> ListEntries(DAHandle doc);
+
+// Whether the document has an annotation table (a clear that empties it frees it).
+bool HasTable(DAHandle doc);
+
+// The table as bytes (empty without one): read-only calls must keep it.
+std::vector<uint8_t> TableBytes(DAHandle doc);
+
+// The entry and position of the last move event (AN_NONE without state).
+uint16_t HoverEntry(DAHandle doc, ANPos *pos);
+
+// The number of the next document range ANBuildAnnos examines.
+uint32_t BuildCursor(DAHandle doc);
+
+// The rules every operation keeps: both lists of the table consistent and together
+// covering every slot once; count the ordered list's length; at least one free slot;
+// capacity a step of 10 up to 65530; `full` only with one free slot left; every entry
+// has a type 1..7 and start at or before end; starts never decrease along the list;
+// hasText set when a text entry is present; every type-5 entry owns a buffer longer
+// than its text and keeps no caller text; the hover entry, if any, is listed. Empty
+// when they hold (also without state or table), otherwise what is broken.
+std::string DocumentRulesBroken(DAHandle doc);
+
+// Annotation text at the plain anchor of `anchor`: the units of the type-5 and type-6
+// entries there in list order, a placeholder read as `placeholder`.
+std::u16string AnchorText(const std::vector<Entry> &list, const ANPos &anchor,
+                          char16_t placeholder = u'\xFFFF');
+
+// A caller block from the process heap, as userData of types 1, 3 and 5 may be.
+uint64_t NewHeapBlock(size_t bytes);
+void FreeHeapBlock(uint64_t block);
+
+// A position as text: (item, sub or -, kind, index).
+std::string PosText(const ANPos &pos);
+
+}  // namespace annotest
+
+#endif  // ANNO_TESTS_TABLE_VIEW_H
