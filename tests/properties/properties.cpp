@@ -5,7 +5,8 @@
 // every run is repeatable; a broken expectation aborts with the operations that led
 // to it.
 //
-//   anno_properties replay DIR...           every file of the corpus directories
+//   anno_properties replay PATH...          the files given, and every file of the
+//                                           directories given (the seed corpus)
 //   anno_properties random SEED COUNT [FILL] COUNT generated inputs; FILL entries first
 //   anno_properties sweep KIND SEED COUNT [FILL]  failure sweeps over COUNT generated
 //                                           inputs: KIND allocations or calls (module calls)
@@ -47,12 +48,17 @@ void Run(const std::vector<uint8_t> &input) { annofuzz::RunInput(input.data(), i
 
 int Replay(int argc, char **argv) {
     size_t files = 0;
+    auto replay = [&](const std::filesystem::path &path) {
+        std::ifstream in(path, std::ios::binary);
+        Run(std::vector<uint8_t>(std::istreambuf_iterator<char>(in), {}));
+        ++files;
+    };
     for (int i = 2; i < argc; ++i) {
-        for (const auto &file : std::filesystem::directory_iterator(argv[i])) {
-            std::ifstream in(file.path(), std::ios::binary);
-            Run(std::vector<uint8_t>(std::istreambuf_iterator<char>(in), {}));
-            ++files;
+        if (!std::filesystem::is_directory(argv[i])) {
+            replay(argv[i]);
+            continue;
         }
+        for (const auto &file : std::filesystem::directory_iterator(argv[i])) replay(file.path());
     }
     std::printf("%zu inputs replayed\n", files);
     return files > 0 ? 0 : 1;
