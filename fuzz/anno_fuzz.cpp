@@ -290,6 +290,8 @@ class Run {
     // The operations.
     void Add(Document &d);
     void AddBad(Document &d);
+    void CheckAdded(Document &d, uint16_t type, const ANPos &at, const std::vector<Entry> &before,
+                    const std::vector<uint16_t> &text, const ANAnnoRecord *heard);
     void Clear(Document &d);
     void ClearUserData(Document &d);
     void Track(Document &d);
@@ -623,12 +625,53 @@ void Run::Add(Document &d) {
         CHECK(rc == AN_ERR_NOSTATE || rc == AN_ERR_BADARG, "adding without state gave " + N(rc));
         return;
     }
+    if (rc == 0) CheckAdded(d, type, start, before, text, d.callback ? &notes[0].record : nullptr);
     if (type == AN_TYPE_TEXT && textPointer == nullptr && !text.empty()) {
         CHECK(rc == AN_ERR_BADARG, "a text at a null pointer gave " + N(rc));
     }
     CHECK(rc == 0 || rc == AN_ERR_BADARG, "adding gave " + N(rc));
     if (rc == AN_ERR_BADARG)
         CHECK(SameListing(before, ListEntries(d.handle)), "a refused add changed the table");
+}
+
+// What an add must have done: a point, a highlight or a cut marker is the one new entry,
+// with the record the callback heard, and the others keep their order; text and placeholders go into the annotation text of their anchor where the position
+// says, and the text of every other anchor stays as it was.
+void Run::CheckAdded(Document &d, uint16_t type, const ANPos &at, const std::vector<Entry> &before,
+                     const std::vector<uint16_t> &text, const ANAnnoRecord *heard) {
+    const std::vector<Entry> after = ListEntries(d.handle);
+    bool plain = at.kind == 0 || at.kind == ANPOS_ANNOTEXT;  // not a kind of the caller's own
+    for (const Entry &e : before) plain &= e.record.start.kind == 0 || e.record.start.kind == 5;
+    if ((type == AN_TYPE_TEXT || type == AN_TYPE_PLACEHOLDER) && plain) {
+        std::u16string inserted(text.begin(), text.end());
+        if (type == AN_TYPE_PLACEHOLDER) inserted = u"\xFFFF";
+        std::u16string expected = AnchorText(before, at);
+        const size_t k = at.kind == ANPOS_ANNOTEXT ? at.textIndex : expected.size();
+        CHECK(k <= expected.size(), "text went in outside its anchor's text");
+        expected.insert(k, inserted);
+        CHECK(AnchorText(after, at) == expected, "annotation text at " + Text(at) + " after adding");
+        for (const Entry &e : before) {
+            if (!SameAnchor(e.record.start, at))
+                CHECK(AnchorText(after, e.record.start) == AnchorText(before, e.record.start),
+                      "adding text changed the text at " + Text(e.record.start));
+        }
+        return;
+    }
+    if (type == AN_TYPE_RANGE || type == AN_TYPE_TEXT || type == AN_TYPE_PLACEHOLDER || !heard)
+        return;
+    CHECK(after.size() == before.size() + 1, "adding made " + N(after.size() - before.size()));
+    size_t i = 0;
+    while (i < before.size() && after[i].slot == before[i].slot) ++i;
+    const Entry &added = after[i];
+    const ANAnnoRecord &r = added.record;
+    CHECK(added.type == type && r.tag == heard->tag && Same(r.start, heard->start) &&
+              r.eventMask == heard->eventMask && r.userData == heard->userData &&
+              r.value == heard->value &&
+              (type != AN_TYPE_HILITE || r.style == heard->style) &&
+              (type != AN_TYPE_HILITE || Same(heard->start, heard->end) || Same(r.end, heard->end)),
+          "the new entry is not what the callback heard");
+    for (size_t j = i; j < before.size(); ++j)
+        CHECK(after[j + 1].slot == before[j].slot, "adding moved other entries");
 }
 
 void Run::AddBad(Document &d) {
@@ -1126,7 +1169,24 @@ void Run::Copy() {
             CHECK(AnchorText(after, e.record.start) == AnchorText(source, e.record.start),
                   "copied annotation text at " + Text(e.record.start));
         }
+        // Every point, highlight and cut marker once more (texts and ranges may join).
         CHECK(after.size() <= source.size(), "copying made more entries than the source has");
+        std::vector<bool> used(after.size());
+        for (const Entry &y : source) {
+            if (y.type == AN_TYPE_RANGE || y.type == AN_TYPE_TEXT || y.type == AN_TYPE_PLACEHOLDER)
+                continue;
+            size_t i = 0;
+            for (; i < after.size(); ++i) {
+                const ANAnnoRecord &x = after[i].record;
+                if (!used[i] && after[i].type == y.type && x.tag == y.record.tag &&
+                    Same(x.start, y.record.start) && Same(x.end, y.record.end) &&
+                    x.userData == y.record.userData && x.value == y.record.value &&
+                    after[i].text == y.text && !after[i].ownsUserData)
+                    break;
+            }
+            CHECK(i < after.size(), "no copy of the entry at " + Text(y.record.start));
+            used[i] = true;
+        }
     }
 }
 
