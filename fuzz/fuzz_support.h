@@ -28,21 +28,17 @@ class Input {
     uint32_t below(uint32_t n) {
         if (n <= 1) return 0;
         if (n <= 256) return byte() % n;
-        if (n <= 65536) return u16() % n;
-        return u32() % n;
+        return n <= 65536 ? u16() % n : u32() % n;
     }
-    // True with probability about k/256.
-    bool chance(uint32_t k) { return byte() < k; }
+    bool chance(uint32_t k) { return byte() < k; }  // true with probability about k/256
 
  private:
     const uint8_t *data_;
-    size_t size_;
-    size_t pos_ = 0;
+    size_t size_, pos_ = 0;
 };
 
-// Library calls made by the target so far, over all inputs.
+// Library calls made by the target so far, over all inputs: CALL(ANAddAnno(doc, type, desc)).
 extern uint64_t apiCalls;
-// Counts one library call: CALL(ANAddAnno(doc, type, desc)).
 #define CALL(expr) (++::annofuzz::apiCalls, (expr))
 
 // What the current operation is, for failure reports.
@@ -50,18 +46,15 @@ void SetContext(const std::string &what);
 // Reports a broken expectation with the context and the input's operations so far,
 // then aborts (a finding for the fuzzer, a failed test for the replay).
 [[noreturn]] void Fail(const std::string &what);
-#define CHECK(cond, what)                                                  \
-    do {                                                                   \
-        if (!(cond)) ::annofuzz::Fail(std::string(#cond) + ": " + (what)); \
-    } while (0)
+#define CHECK(cond, what) ((cond) ? (void)0 : ::annofuzz::Fail(std::string(#cond) + ": " + (what)))
 
+inline std::string N(uint64_t v) { return std::to_string(v); }
 inline int Cmp(const ANPos &a, const ANPos &b) { return ANCompPos(&a, &b); }
-inline bool Same(const ANPos &a, const ANPos &b) {
-    return a.itemId == b.itemId && a.subItemId == b.subItemId && a.kind == b.kind &&
-           a.textIndex == b.textIndex;
-}
 inline bool SameAnchor(const ANPos &a, const ANPos &b) {
     return a.itemId == b.itemId && a.subItemId == b.subItemId;
+}
+inline bool Same(const ANPos &a, const ANPos &b) {
+    return SameAnchor(a, b) && a.kind == b.kind && a.textIndex == b.textIndex;
 }
 std::string Text(const ANPos &pos);
 
@@ -73,30 +66,22 @@ using annotest::ListEntries;
 using annotest::TableBytes;
 
 // Index of each slot in a listing, -1 for slots not listed.
-class SlotIndex {
- public:
+struct SlotIndex {
     explicit SlotIndex(const std::vector<Entry> &list);
-    int operator[](uint16_t slot) const { return slot < at_.size() ? at_[slot] : -1; }
-
- private:
-    std::vector<int> at_;
+    int operator[](uint16_t slot) const { return slot < at.size() ? at[slot] : -1; }
+    std::vector<int> at;
 };
-inline SlotIndex ListIndex(const std::vector<Entry> &list) { return SlotIndex(list); }
 // Whether two listings are the same entries with the same records and texts.
 bool SameListing(const std::vector<Entry> &a, const std::vector<Entry> &b);
-
 
 // How the runs of one process decode their inputs (the fuzzer keeps the defaults).
 struct Settings {
     // Entries added to the first document before the operations, so that its table is
     // large enough for the lookup index of every build.
     uint32_t fillers = 0;
-    // Every operation runs as if a failure were armed: the sweeps arm their own.
-    bool sweep = false;
-    // Called once the documents are made and bound, before the first operation.
-    std::function<void()> arm;
-    // Called when the operations are over, before the input's state is released.
-    std::function<void()> disarm;
+    bool sweep = false;  // every operation runs as if a failure were armed (sweeps arm their own)
+    std::function<void()> arm;     // once the documents are made and bound, before the first op
+    std::function<void()> disarm;  // when the operations are over, before the state is released
 };
 extern Settings settings;
 
