@@ -1,4 +1,4 @@
-#include "oracles.h"
+#include "fuzz_support.h"
 
 #include <algorithm>
 #include <cstring>

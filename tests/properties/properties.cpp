@@ -64,39 +64,39 @@ int Replay(int argc, char **argv) {
     return files > 0 ? 0 : 1;
 }
 
+#if !defined(_WIN32)
+constexpr bool kHeapControls = true;
+void ResetAllocations() { anwin::resetCounters(); }
+uint64_t Allocations() { return anwin::allocations(); }
+void FailAllocation(uint64_t n, bool sticky) { anwin::failAllocation(n, sticky); }
+#else
+constexpr bool kHeapControls = false;  // the system heap has no failure injection
+void ResetAllocations() {}
+uint64_t Allocations() { return 0; }
+void FailAllocation(uint64_t, bool) {}
+#endif
+
 // Runs `input` once to count the failure points of its operations, then once with
 // each failing alone and once with each failing from then on. The decoder treats
 // every operation as one a failure may hit: results are not held to the readings, but
 // the rules hold after every operation, notifications match what was added or
 // removed, and nothing is left behind.
 uint64_t Sweep(const std::vector<uint8_t> &input, bool allocations) {
-#if defined(_WIN32)
-    if (allocations) return 0;  // the system heap has no failure injection
-#endif
+    if (allocations && !kHeapControls) return 0;
     uint64_t points = 0;
     annofuzz::settings.sweep = true;
     annofuzz::settings.arm = [] {
-#if !defined(_WIN32)
-        anwin::resetCounters();
-#endif
+        ResetAllocations();
         antk::resetCalls();
     };
-    annofuzz::settings.disarm = [&] {
-#if !defined(_WIN32)
-        points = allocations ? anwin::allocations() : antk::totalCalls();
-#else
-        points = antk::totalCalls();
-#endif
-    };
+    annofuzz::settings.disarm = [&] { points = allocations ? Allocations() : antk::totalCalls(); };
     Run(input);
     const uint64_t total = points;
     annofuzz::settings.disarm = nullptr;
     for (uint64_t n = 1; n <= total; ++n) {
         for (const bool sticky : {false, true}) {
             annofuzz::settings.arm = [=] {
-#if !defined(_WIN32)
-                if (allocations) anwin::failAllocation(n, sticky);
-#endif
+                if (allocations) FailAllocation(n, sticky);
                 if (!allocations) antk::failAnyCall(n, kModuleCode, sticky);
             };
             Run(input);
@@ -124,12 +124,12 @@ int main(int argc, char **argv) {
             if (mode == "sweep") points += Sweep(input, std::string(argv[2]) == "allocations");
         }
         std::printf("%llu inputs, %llu failure points swept, %llu library calls\n",
-                    static_cast<unsigned long long>(count),
-                    static_cast<unsigned long long>(points),
+                    static_cast<unsigned long long>(count), static_cast<unsigned long long>(points),
                     static_cast<unsigned long long>(annofuzz::apiCalls));
         return 0;
     }
-    std::fprintf(stderr, "usage: anno_properties replay DIR... | random SEED COUNT [FILL] |"
-                         " sweep allocations|calls SEED COUNT\n");
+    std::fprintf(stderr,
+                 "usage: anno_properties replay DIR... | random SEED COUNT [FILL] |"
+                 " sweep allocations|calls SEED COUNT\n");
     return 2;
 }

@@ -40,8 +40,11 @@ DAHandle PlainDocument(uint32_t count) {
     return builder.build();
 }
 
-uint32_t AddHilite(DAHandle doc, const ANPos &start, const ANPos &end, uint32_t tag, uint32_t style,
-                   uint64_t userData, uint32_t eventMask, uint64_t value) {
+namespace {
+
+uint32_t AddFullRecord(DAHandle doc, uint16_t type, const ANPos &start, const ANPos &end,
+                       uint32_t tag, uint32_t style, uint64_t userData, uint32_t eventMask,
+                       uint64_t value) {
     ANAnnoRecord d{};
     d.size = AN_RECORD_SIZE_POINT;
     d.tag = tag;
@@ -51,66 +54,50 @@ uint32_t AddHilite(DAHandle doc, const ANPos &start, const ANPos &end, uint32_t 
     d.userData = userData;
     d.value = value;
     d.style = style;
-    return ANAddAnno(doc, AN_TYPE_HILITE, &d);
+    return ANAddAnno(doc, type, &d);
+}
+
+}  // namespace
+
+uint32_t AddHilite(DAHandle doc, const ANPos &start, const ANPos &end, uint32_t tag, uint32_t style,
+                   uint64_t userData, uint32_t eventMask, uint64_t value) {
+    return AddFullRecord(doc, AN_TYPE_HILITE, start, end, tag, style, userData, eventMask, value);
 }
 
 uint32_t AddPoint(DAHandle doc, const ANPos &pos, uint32_t tag, uint64_t value, uint16_t type,
                   uint32_t eventMask, uint64_t userData) {
-    ANAnnoRecord d{};
-    d.size = AN_RECORD_SIZE_POINT;
-    d.tag = tag;
-    d.start = pos;
-    d.end = pos;
-    d.eventMask = eventMask;
-    d.userData = userData;
-    d.value = value;
-    return ANAddAnno(doc, type, &d);
+    return AddFullRecord(doc, type, pos, pos, tag, 0, userData, eventMask, value);
 }
 
 uint32_t AddRange(DAHandle doc, const ANPos &start, const ANPos &end, uint32_t tag,
                   uint64_t userData) {
-    ANRangeDesc d{};
-    d.size = sizeof(d);
-    d.tag = tag;
-    d.start = start;
-    d.end = end;
-    d.userData = userData;
+    const ANRangeDesc d{sizeof(ANRangeDesc), tag, start, end, userData};
     return ANAddAnno(doc, AN_TYPE_RANGE, &d);
 }
 
 uint32_t AddText(DAHandle doc, const ANPos &pos, std::u16string_view text, uint32_t tag,
                  uint64_t userData) {
-    ANTextDesc d{};
-    d.size = sizeof(d);
-    d.tag = tag;
-    d.pos = pos;
-    d.userData = userData;
-    d.text = reinterpret_cast<const uint16_t *>(text.data());
-    d.textLength = static_cast<uint32_t>(text.size());
+    const ANTextDesc d{sizeof(ANTextDesc),
+                       tag,
+                       pos,
+                       userData,
+                       reinterpret_cast<const uint16_t *>(text.data()),
+                       static_cast<uint32_t>(text.size()),
+                       0};
     return ANAddAnno(doc, AN_TYPE_TEXT, &d);
 }
 
 uint32_t AddMark(DAHandle doc, uint16_t type, const ANPos &pos, uint32_t tag, uint64_t userData) {
-    ANPointDesc d{};
-    d.size = sizeof(d);
-    d.tag = tag;
-    d.pos = pos;
-    d.userData = userData;
+    const ANPointDesc d{sizeof(ANPointDesc), tag, pos, userData};
     return ANAddAnno(doc, type, &d);
 }
 
 uint32_t Notifications::Callback(uint16_t code, uint16_t detail, void *record, void *self) {
     auto *me = static_cast<Notifications *>(self);
-    Notification n{};
-    n.code = code;
-    n.detail = detail;
-    if (record != nullptr) {
-        if (code == ANNOTIFY_EVENT) {
-            std::memcpy(&n.event, record, sizeof(n.event));
-        } else {
-            std::memcpy(&n.record, record, sizeof(n.record));
-        }
-    }
+    Notification n{code, detail, {}, {}};
+    if (record != nullptr && code == ANNOTIFY_EVENT) std::memcpy(&n.event, record, sizeof n.event);
+    if (record != nullptr && code != ANNOTIFY_EVENT)
+        std::memcpy(&n.record, record, sizeof n.record);
     me->calls.push_back(n);
     return me->result;
 }

@@ -1,7 +1,6 @@
-// What every test of the library shares: a fixture that fails a test which leaks a
-// heap or global-memory block or leaves an injected failure armed, documents that
-// release themselves, adding each annotation type in its largest descriptor form, and
-// a callback that records what it hears.
+// What the GoogleTest suites share: a fixture that fails a test which leaks a heap or
+// global-memory block, documents that release themselves, adding each annotation type in
+// its largest descriptor form, and a callback that records what it hears.
 #ifndef ANNO_TESTS_FIXTURE_H
 #define ANNO_TESTS_FIXTURE_H
 
@@ -42,10 +41,6 @@ class LeakCheckedTest : public ::testing::Test {
     int64_t heapAtStart_ = 0;
     int64_t globalAtStart_ = 0;
 };
-
-// The same for value-parameterised tests.
-template <typename Row>
-class LeakCheckedRows : public LeakCheckedTest, public ::testing::WithParamInterface<Row> {};
 
 // A toolkit document, destroyed (after ANDeInit) when it goes out of scope.
 class Doc {

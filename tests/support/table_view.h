@@ -1,8 +1,6 @@
-// The one place where tests look at a document's annotation table from inside: the
-// table's rules, checked after every operation, and a plain listing of the ordered
-// list that the brute-force readings work from. Nothing else in the tests knows how
-// the table is laid out, so this file alone follows a redesign of the insides.
-// Framework-free, so that the GoogleTest suites and the fuzz target share it.
+// The one place where tests look inside a document's annotation table: its rules, and a
+// plain listing of the ordered list for the brute-force readings. Only this file follows a
+// redesign of the insides. Framework-free: the GoogleTest suites and the fuzz target share it.
 #ifndef ANNO_TESTS_TABLE_VIEW_H
 #define ANNO_TESTS_TABLE_VIEW_H
 
@@ -15,9 +13,7 @@
 
 namespace annotest {
 
-// One entry of the ordered list, copied out. `slot` is the number tracking and
-// events hand out for it.
-struct Entry {
+struct Entry {  // one entry of the ordered list; `slot` is its number in tracking and events
     uint16_t slot;
     uint16_t type;
     bool ownsUserData;  // userData is a caller's heap block that ANClearUserData frees
@@ -25,20 +21,11 @@ struct Entry {
     std::u16string text;  // type 5: its units
 };
 
-// The entries of the ordered list, first to last (empty without state or table).
-std::vector<Entry> ListEntries(DAHandle doc);
-
-// Whether the document has an annotation table (a clear that empties it frees it).
-bool HasTable(DAHandle doc);
-
-// The table as bytes (empty without one): read-only calls must keep it.
-std::vector<uint8_t> TableBytes(DAHandle doc);
-
-// The entry and position of the last move event (AN_NONE without state).
-uint16_t HoverEntry(DAHandle doc, ANPos *pos);
-
-// The number of the next document range ANBuildAnnos examines.
-uint32_t BuildCursor(DAHandle doc);
+std::vector<Entry> ListEntries(DAHandle doc);   // first to last; empty without a table
+bool HasTable(DAHandle doc);                    // a clear that empties the table frees it
+std::vector<uint8_t> TableBytes(DAHandle doc);  // what read-only calls must keep
+uint16_t HoverEntry(DAHandle doc, ANPos *pos);  // the last move event's entry and position
+uint32_t BuildCursor(DAHandle doc);             // the next range ANBuildAnnos examines
 
 // The rules every operation keeps: both lists of the table consistent and together
 // covering every slot once; count the ordered list's length; at least one free slot;
@@ -57,9 +44,7 @@ std::u16string AnchorText(const std::vector<Entry> &list, const ANPos &anchor,
 // A caller block from the process heap, as userData of types 1, 3 and 5 may be.
 uint64_t NewHeapBlock(size_t bytes);
 void FreeHeapBlock(uint64_t block);
-
-// A position as text: (item, sub or -, kind, index).
-std::string PosText(const ANPos &pos);
+std::string PosText(const ANPos &pos);  // (item, sub or -, kind, index)
 
 }  // namespace annotest
 
