@@ -30,22 +30,8 @@ namespace annofuzz {
 
 uint64_t apiCalls = 0;
 Settings settings;
-
-namespace {
-
-uint64_t inputs = 0;
-std::string context;
-std::vector<std::string> trail;  // the operations of the current input
-
-void PrintCounts() {
-    std::fprintf(stderr, "anno_fuzz: %llu API calls over %llu inputs\n",
-                 static_cast<unsigned long long>(apiCalls),
-                 static_cast<unsigned long long>(inputs));
-}
-
-const bool registered = [] { return std::atexit(PrintCounts) == 0; }();
-
-}  // namespace
+static std::string context;
+static std::vector<std::string> trail;  // the operations of the current input
 
 void SetContext(const std::string &what) { context = what; }
 
@@ -99,8 +85,7 @@ uint32_t Notify(uint16_t code, uint16_t detail, void *record, void *data) {
     if (record != nullptr)
         std::memcpy(event ? static_cast<void *>(&note.event) : &note.record, record,
                     event ? sizeof note.event : sizeof note.record);
-    recorder->seed = recorder->seed * 1103515245u + 12345u;
-    note.returned = recorder->seed >> 16;
+    note.returned = (recorder->seed = recorder->seed * 1103515245u + 12345u) >> 16;
     recorder->notes.push_back(note);
     return note.returned;
 }
@@ -236,16 +221,10 @@ std::vector<ANPos> WalkPositions(const Document &d, bool check) {
     for (ANPos p = out.front(), next{};; p = next) {
         next = {};
         const uint32_t rc = CALL(ANNextPos(d.handle, &p, &next));
-        if (rc != 0) {
-            if (check) CHECK(rc == AN_ERR_NOTFOUND, "ANNextPos gave " + N(rc));
-            break;
-        }
-        if (check) {
-            CHECK(Cmp(next, p) > 0, "ANNextPos went from " + Text(p) + " back to " + Text(next));
-            CHECK(out.size() <= bound, "the walk does not end");
-        } else if (Cmp(next, p) <= 0 || out.size() > bound) {
-            break;
-        }
+        CHECK(!check || rc == 0 || rc == AN_ERR_NOTFOUND, "ANNextPos gave " + N(rc));
+        const bool onward = Cmp(next, p) > 0 && out.size() <= bound;  // else: goes back, or on
+        CHECK(!check || rc != 0 || onward, "ANNextPos went from " + Text(p) + " to " + Text(next));
+        if (rc != 0 || !onward) break;
         out.push_back(next);
     }
     return out;
@@ -370,7 +349,6 @@ void Run::Go() {
         {31, &Run::Styles, true},         {32, &Run::Copy, false},   {33, &Run::Build, false},
         {34, &Run::Step, true},           {35, &Run::Step, true},    {36, &Run::Callback, false},
         {37, &Run::Lifecycle, false},     {38, &Run::Stale, true},   {40, &Run::ArmFailure, false}};
-    ++inputs;
     trail.clear();
     SetContext("setting up");
     ClearFailures();
@@ -393,30 +371,26 @@ void Run::Go() {
     }
     Bind(a_, in_.chance(220));
     Bind(b_, in_.chance(160));
-    for (Document *d : {&a_, &b_}) {
+    for (Document *d : {&a_, &b_})
         d->staleTextStarted = CALL(ANStartAnnoTextTrack(d->handle, &d->staleText)) == 0;
-        std::memset(&d->stale, 0, sizeof d->stale);
-    }
     Fill(a_);
     if (settings.arm) settings.arm();
 
     for (uint32_t ops = 0; !in_.done() && ops < 64; ++ops) {
         faulty_ = armNext_ || settings.sweep;
         armNext_ = false;
-        if (faulty_) {
+        // Set only by ArmFailure, so only when faulty_.
 #if ANNO_FUZZ_PLATFORM_CONTROLS
-            if (pendingAllocation_ != 0) anwin::failAllocation(pendingAllocation_, pendingSticky_);
+        if (pendingAllocation_ != 0) anwin::failAllocation(pendingAllocation_, pendingSticky_);
 #endif
-            if (pendingCall_ != 0) antk::failAnyCall(pendingCall_, pendingCode_, pendingSticky_);
-            pendingAllocation_ = pendingCall_ = 0;
-        }
+        if (pendingCall_ != 0) antk::failAnyCall(pendingCall_, pendingCode_, pendingSticky_);
+        pendingAllocation_ = pendingCall_ = 0;
         const uint32_t code = in_.below(40);
         Document &d = Pick();
         trail.push_back("op " + N(code) + " on " + Name(d) +
                         (faulty_ ? " with a failure armed" : ""));
         SetContext(trail.back());
-        a_.recorder.notes.clear();
-        b_.recorder.notes.clear();
+        for (Document *x : {&a_, &b_}) x->recorder.notes.clear();
         const Op &op = *std::find_if(std::begin(kOps), std::end(kOps),
                                      [&](const Op &o) { return code < o.below; });
         const std::vector<uint8_t> bytes =
@@ -425,14 +399,7 @@ void Run::Go() {
         CHECK(!op.readOnly || bytes == TableBytes(d.handle), "a read-only op changed the table");
         ClearFailures();
         CheckRules(trail.back());
-        if (!trace) continue;
-        std::fprintf(stderr, "anno_fuzz: done %s\n", trail.back().c_str());
-        for (const Document *doc : {&a_, &b_}) {
-            for (const Entry &e : ListEntries(doc->handle))
-                std::fprintf(stderr, "    %s slot %u type %u tag %u %s to %s\n", Name(*doc), e.slot,
-                             e.type, e.record.tag, Text(e.record.start).c_str(),
-                             Text(e.record.end).c_str());
-        }
+        if (trace) std::fprintf(stderr, "anno_fuzz: done %s\n", trail.back().c_str());
     }
     Finish();
 }
@@ -451,9 +418,8 @@ void Run::Add(Document &d) {
     uint64_t userData = in_.chance(128) ? in_.u32() : 0;
     std::vector<uint16_t> text(in_.below(6));
     for (uint16_t &u : text) u = static_cast<uint16_t>('A' + in_.below(26));
-    const uint16_t *textPointer = text.data();
-    if (text.empty() && in_.chance(128)) textPointer = nullptr;
-    if (!text.empty() && in_.chance(4)) textPointer = nullptr;  // refused with 15
+    // A null text pointer is refused unless the text is empty.
+    const uint16_t *textPointer = in_.chance(text.empty() ? 128 : 4) ? nullptr : text.data();
     const uint32_t size =
         kSizes[type][type == AN_TYPE_TEXT          ? 0
                      : type >= AN_TYPE_PLACEHOLDER ? (in_.chance(128) ? 0 : 1)
@@ -507,26 +473,22 @@ void Run::Add(Document &d) {
     } else if (d.callback) {
         CHECK(notes.size() == 1 && notes[0].code == ANNOTIFY_ADDED && notes[0].detail == type,
               N(notes.size()) + " notifications for one add");
-        const ANAnnoRecord &r = notes[0].record;
-        CHECK(r.tag == tag, "notified tag " + N(r.tag));
-        CHECK(Cmp(r.start, r.end) <= 0, "notified record out of order");
-        if (type != AN_TYPE_HILITE && type != AN_TYPE_RANGE)
-            CHECK(Same(r.start, r.end), "a point notified with an extent");
-        const uint32_t normalised = type == AN_TYPE_TEXT ? AN_RECORD_SIZE_TEXT
-                                    : type == AN_TYPE_RANGE || type >= AN_TYPE_PLACEHOLDER
-                                        ? AN_RECORD_SIZE_SHORT
-                                        : AN_RECORD_SIZE_POINT;
-        CHECK(r.size == normalised, "notified size " + N(r.size));
+        const ANAnnoRecord &r = notes[0].record;  // points have no extent; sizes normalised
+        const uint32_t size = type == AN_TYPE_TEXT ? AN_RECORD_SIZE_TEXT
+                              : type == AN_TYPE_RANGE || type >= AN_TYPE_PLACEHOLDER
+                                  ? AN_RECORD_SIZE_SHORT
+                                  : AN_RECORD_SIZE_POINT;
+        CHECK(r.tag == tag && Cmp(r.start, r.end) <= 0 && r.size == size &&
+                  (type == AN_TYPE_HILITE || type == AN_TYPE_RANGE || Same(r.start, r.end)),
+              "notified tag " + N(r.tag) + " size " + N(r.size) + " " + Text(r.start));
     } else {
         CHECK(notes.empty(), "notified without a callback");
     }
     if (Unheld(d, rc == AN_ERR_NOSTATE || rc == AN_ERR_BADARG, rc)) return;
     if (rc == 0) CheckAdded(d, type, start, before, text, d.callback ? &notes[0].record : nullptr);
-    if (type == AN_TYPE_TEXT && textPointer == nullptr && !text.empty())
-        CHECK(rc == AN_ERR_BADARG, "a text at a null pointer gave " + N(rc));
-    CHECK(rc == 0 || rc == AN_ERR_BADARG, "adding gave " + N(rc));
-    if (rc == AN_ERR_BADARG)
-        CHECK(SameListing(before, ListEntries(d.handle)), "a refused add changed the table");
+    const bool nullText = type == AN_TYPE_TEXT && textPointer == nullptr && !text.empty();
+    CHECK(rc == AN_ERR_BADARG || (rc == 0 && !nullText), "adding gave " + N(rc));
+    CHECK(rc == 0 || SameListing(before, ListEntries(d.handle)), "a refused add changed the table");
 }
 
 // What an add must have done: a point, a highlight or a cut marker is the one new entry,
@@ -545,11 +507,10 @@ void Run::CheckAdded(Document &d, uint16_t type, const ANPos &at, const std::vec
         expected.insert(
             k, type == AN_TYPE_PLACEHOLDER ? u"\xFFFF" : std::u16string(text.begin(), text.end()));
         CHECK(AnchorText(after, at) == expected, "text at " + Text(at));
-        for (const Entry &e : before) {
-            if (!SameAnchor(e.record.start, at))
-                CHECK(AnchorText(after, e.record.start) == AnchorText(before, e.record.start),
-                      "text at " + Text(e.record.start));
-        }
+        for (const Entry &e : before)
+            CHECK(SameAnchor(e.record.start, at) ||
+                      AnchorText(after, e.record.start) == AnchorText(before, e.record.start),
+                  "text at " + Text(e.record.start));
         return;
     }
     if (type == AN_TYPE_RANGE || type == AN_TYPE_TEXT || type == AN_TYPE_PLACEHOLDER || !heard)
@@ -593,9 +554,10 @@ void Run::Clear(Document &d) {
     const uint32_t value = PickTag(in_);
     trail.back() += ": clear flags " + N(flags) + " value " + N(value);
     auto selected = [&](uint32_t tag) {
-        if (flags == 0) return (tag & ANTAG_PROTECTED) == 0;
-        if ((flags & ANCLEAR_EQUAL) != 0) return tag == value;
-        return (flags & ANCLEAR_MASK) != 0 && (tag & value) == value;
+        return flags == 0 ? (tag & ANTAG_PROTECTED) == 0
+               : (flags & ANCLEAR_EQUAL) != 0
+                   ? tag == value
+                   : (flags & ANCLEAR_MASK) != 0 && (tag & value) == value;
     };
     const std::vector<Entry> before = ListEntries(d.handle);
     const std::vector<uint8_t> bytes = TableBytes(d.handle);
@@ -623,11 +585,9 @@ void Run::Clear(Document &d) {
           "result " + N(rc) + ", " + N(notes.size()) + " removals, the last said " + N(last));
     if (after.empty()) CHECK(!HasTable(d.handle), "an emptied table was kept");
     // The annotation text at every anchor loses exactly the units of the removed texts.
-    for (const Entry &e : before) {
-        if (IsText(e))
-            CHECK(AnchorText(after, e.record.start) == AnchorText(kept, e.record.start),
-                  "text at " + Text(e.record.start));
-    }
+    for (const Entry &e : before)
+        CHECK(!IsText(e) || AnchorText(after, e.record.start) == AnchorText(kept, e.record.start),
+              "text at " + Text(e.record.start));
 }
 
 void Run::ClearUserData(Document &d) {
@@ -643,8 +603,7 @@ void Run::ClearUserData(Document &d) {
     const std::set<uint64_t> still = owned();
     for (uint64_t block : before)
         if (still.count(block) == 0) d.blocks.erase(block);
-    if (!faulty_)
-        CHECK(rc == 0 && still.empty(), "gave " + N(rc) + ", " + N(still.size()) + " blocks left");
+    CHECK(faulty_ || (rc == 0 && still.empty()), N(rc) + ", " + N(still.size()) + " blocks left");
 }
 
 // ---- Reading -------------------------------------------------------------------------------
@@ -664,10 +623,7 @@ void Run::Track(Document &d) {
         if (Cmp(p, start) >= 0 && (skip == 0 || in_.below(4) >= skip)) visit.push_back(p);
     const uint32_t markLeft = in_.chance(32) ? 1 : 0;
     trail.back() += ": tracking walk from " + Text(start) + " over " + N(visit.size());
-    if (!faulty_) {
-        CheckTrackingWalk(d.handle, start, visit, markLeft);
-        return;
-    }
+    if (!faulty_) return CheckTrackingWalk(d.handle, start, visit, markLeft);
     ANTrackInfo track{};
     CALL(ANStartAnnoTrack(d.handle, &start, &track));
     for (const ANPos &p : visit) CALL(ANTrackAnno(d.handle, &p, &track));
@@ -689,17 +645,11 @@ void Run::TextReads(Document &d) {
         positions.push_back(p);
     }
     trail.back() += ": " + N(count) + " text reads";
-    if (!faulty_) {
-        CheckTextReads(d.handle, positions);
-        return;
-    }
+    if (!faulty_) return CheckTextReads(d.handle, positions);
     ANAnnoTextTrack track{};
-    if (CALL(ANStartAnnoTextTrack(d.handle, &track)) == 0) {
-        for (const ANPos &p : positions) {
-            uint16_t unit = 0;
-            CALL(ANGetAnnoText(d.handle, &track, &p, &unit));
-        }
-    }
+    uint16_t unit = 0;
+    if (CALL(ANStartAnnoTextTrack(d.handle, &track)) == 0)
+        for (const ANPos &p : positions) CALL(ANGetAnnoText(d.handle, &track, &p, &unit));
     CALL(ANEndAnnoTextTrack(d.handle, &track));
     CHECK(track.segs == nullptr, "an ended text track keeps its list");
 }
@@ -759,13 +709,10 @@ void Run::Find(Document &d) {
     if (rc != 0) return;
     CHECK(find.foundTag == expected.foundTag && find.foundUserData == expected.foundUserData &&
               Same(find.foundEnd, expected.foundEnd) &&
-              (!startKnown || Same(find.foundStart, expected.foundStart)),
-          "found tag " + N(find.foundTag) + " " + Text(find.foundStart) + " to " +
-              Text(find.foundEnd) + ", expected " + N(expected.foundTag) + " " +
-              Text(expected.foundStart) + " to " + Text(expected.foundEnd));
-    CHECK(find.size == before.size && find.mode == before.mode && find.tag == before.tag &&
+              (!startKnown || Same(find.foundStart, expected.foundStart)) &&
+              find.size == before.size && find.mode == before.mode && find.tag == before.tag &&
               Same(find.key, before.key),
-          "input fields written");
+          "found tag " + N(find.foundTag) + " at " + Text(find.foundStart) + ", or inputs written");
 }
 
 void Run::Map(Document &d) {
@@ -777,11 +724,8 @@ void Run::Map(Document &d) {
     uint32_t characters = 0;
     for (const antk::ItemView &item : d.items) characters += item.charCount;
     map.ordinal = in_.below(characters + 3);
-    map.pos = PickPos(in_, d);
-    map.pos.kind = in_.u32();
-    map.pos.textIndex = in_.u32();
-    trail.back() +=
-        ": map flags " + N(map.flags) + " ordinal " + N(map.ordinal) + " pos " + Text(map.pos);
+    map.pos = PickPos(in_, d), map.pos.kind = in_.u32(), map.pos.textIndex = in_.u32();
+    trail.back() += ": map " + N(map.flags) + " ordinal " + N(map.ordinal) + " " + Text(map.pos);
     const ANMapRecord before = map;
     const uint32_t rc = CALL(ANMapPosition(d.handle, &map));
     CHECK(map.size == before.size && map.flags == before.flags && map.pos.kind == before.pos.kind &&
@@ -794,14 +738,13 @@ void Run::Map(Document &d) {
           "mapping gave " + N(rc));
     // A character of a text item maps to its ordinal and back to itself.
     if (bad || (map.flags & ANMAP_ORDINAL_TO_POS) != 0 || rc != 0) return;
-    auto character = [&](const antk::ItemView &item) {
-        return item.id == before.pos.itemId && item.type == antk::kItemText &&
-               before.pos.subItemId - item.firstChar < item.charCount;
-    };
-    if (std::none_of(d.items.begin(), d.items.end(), character)) return;
+    if (std::none_of(d.items.begin(), d.items.end(), [&](const antk::ItemView &item) {
+            return item.id == before.pos.itemId && item.type == antk::kItemText &&
+                   before.pos.subItemId - item.firstChar < item.charCount;
+        }))
+        return;
     ANMapRecord back = map;
-    back.flags = ANMAP_ORDINAL_TO_POS;
-    back.pos.itemId = back.pos.subItemId = 0x12345;
+    back.flags = ANMAP_ORDINAL_TO_POS, back.pos.itemId = back.pos.subItemId = 0x12345;
     if (CALL(ANMapPosition(d.handle, &back)) == 0 && back.pos.itemId != 0x12345)
         CHECK(SameAnchor(back.pos, before.pos), "ordinal maps back to " + Text(back.pos));
 }
@@ -817,45 +760,34 @@ void Run::Styles(Document &d) {
     ANHiliteStyle stored = style;  // an old-size style reads back with attr2 0xFFFF
     if (size == ANHILITESTYLE_SIZE_OLD)
         stored.size = ANHILITESTYLE_SIZE, stored.attr2 = 0xFFFF, stored.reserved = 0;
-    const uint32_t how = in_.below(3) * 2;
+    const uint32_t how = in_.below(3);  // the global table (if any), the document's, a new one
     trail.back() += ": styles " + N(how) + " id " + N(style.styleId) + " size " + N(size);
-    ANHiliteStyle got{};
-    switch (how) {
-        case 0:    // the global table, when there is one
-        case 2: {  // the document's
-            const bool global = how == 0;
-            const uint32_t rc = CALL(global ? ANAddGlobalHiliteStyle(global_, &style)
-                                            : ANAddHiliteStyle(d.handle, &style));
-            if (faulty_) break;
-            const uint32_t want = global      ? (global_ == nullptr || !good ? AN_ERR_BADARG : 0)
-                                  : !Bound(d) ? AN_ERR_NOSTATE
-                                  : !good     ? AN_ERR_BADARG
-                                              : 0;
-            CHECK(rc == want, "adding a style gave " + N(rc) + ", not " + N(want));
-            if (rc != 0) break;
-            const uint32_t found =
-                CALL(global ? ANGetGlobalHiliteStyle(global_, style.styleId, &got)
-                            : ANGetHiliteStyle(d.handle, style.styleId, &got));
-            CHECK(found == (global ? 0u : 1u) && std::memcmp(&got, &stored, sizeof got) == 0,
-                  "style " + N(style.styleId) + " reads back otherwise: " + N(found));
-            break;
-        }
-        default: {  // a table of one's own, made and freed
-            ANStyleTable *table = nullptr;
-            const uint32_t rc = CALL(ANInitGlobalHiliteStyles(in_.chance(240) ? &table : nullptr));
-            if (table != nullptr) {
-                for (uint32_t adds = in_.below(24); adds > 0; --adds) {
-                    style.styleId = in_.below(30);
-                    CALL(ANAddGlobalHiliteStyle(table, &style));
-                }
-                CHECK(CALL(ANDeInitGlobalHiliteStyles(table)) == 0, "freeing a style table");
-            } else if (!faulty_) {
-                CHECK(rc == AN_ERR_BADARG, "a null handle gave " + N(rc));
-            }
-            CHECK(CALL(ANDeInitGlobalHiliteStyles(nullptr)) == AN_ERR_BADARG, "freeing no table");
-            break;
-        }
+    if (how == 2) {  // a table of one's own, made and freed
+        ANStyleTable *table = nullptr;
+        const uint32_t rc = CALL(ANInitGlobalHiliteStyles(in_.chance(240) ? &table : nullptr));
+        for (uint32_t adds = table != nullptr ? in_.below(24) : 0; adds > 0; --adds)
+            style.styleId = in_.below(30), CALL(ANAddGlobalHiliteStyle(table, &style));
+        CHECK(table != nullptr ? CALL(ANDeInitGlobalHiliteStyles(table)) == 0
+                               : faulty_ || rc == AN_ERR_BADARG,
+              "a style table of one's own: " + N(rc));
+        CHECK(CALL(ANDeInitGlobalHiliteStyles(nullptr)) == AN_ERR_BADARG, "freeing no table");
+        return;
     }
+    const bool global = how == 0;
+    const uint32_t rc =
+        CALL(global ? ANAddGlobalHiliteStyle(global_, &style) : ANAddHiliteStyle(d.handle, &style));
+    if (faulty_) return;
+    const uint32_t want = global      ? (global_ == nullptr || !good ? AN_ERR_BADARG : 0)
+                          : !Bound(d) ? AN_ERR_NOSTATE
+                          : !good     ? AN_ERR_BADARG
+                                      : 0;
+    CHECK(rc == want, "adding a style gave " + N(rc) + ", not " + N(want));
+    if (rc != 0) return;
+    ANHiliteStyle got{};
+    const uint32_t found = CALL(global ? ANGetGlobalHiliteStyle(global_, style.styleId, &got)
+                                       : ANGetHiliteStyle(d.handle, style.styleId, &got));
+    CHECK(found == (global ? 0u : 1u) && std::memcmp(&got, &stored, sizeof got) == 0,
+          "style " + N(style.styleId) + " reads back otherwise: " + N(found));
 }
 
 void Run::Copy(Document &) {
@@ -928,12 +860,9 @@ void Run::Step(Document &d) {
         for (const auto &a : TextAnchors(ListEntries(d.handle))) textAnchors.push_back(a.first);
         auto isContent = [&](const ANPos &p) { return AtAnchor(d.content, p); };
         for (const ANPos &p : walk) {
-            if (p.kind == ANPOS_ANNOTEXT) {
-                CHECK(AtAnchor(textAnchors, p), "the walk entered annotation text at " + Text(p));
-                continue;
-            }
-            CHECK(isContent(p) || AtAnchor(textAnchors, p), "the walk met " + Text(p));
-            visited.push_back(p);
+            const bool inText = p.kind == ANPOS_ANNOTEXT;
+            CHECK(AtAnchor(textAnchors, p) || (!inText && isContent(p)), "the walk met " + Text(p));
+            if (!inText) visited.push_back(p);
         }
         // Every content position is met up to the first anchor of annotation text that
         // is not content (a text item itself, or a place the chunker does not have),
@@ -960,27 +889,18 @@ void Run::Step(Document &d) {
         const uint32_t rc = CALL(how == 0   ? ANNextPos(doc, &p, &next)
                                  : how == 2 ? ANNextAnnoTextPos(doc, &p, &next)
                                             : ANNextChunkerPos(doc, &p, &next));
-        auto said = [&] {
-            static const char *const kNames[] = {"ANNextPos", "ANNextChunkerPos",
-                                                 "ANNextAnnoTextPos", "ANNextChunkerPos(null)"};
-            return kNames[how] + (" gave " + N(rc) + " from " + Text(p) + " to " + Text(next));
-        };
-        CHECK(how != 3 || text || rc == AN_ERR_BADARG, said());
+        const std::string said =
+            "step " + N(how) + " gave " + N(rc) + " from " + Text(p) + " to " + Text(next);
+        CHECK(how != 3 || text || rc == AN_ERR_BADARG, said);
         if (how == 3 || faulty_) continue;
-        if (how == 0) {
-            CHECK(rc == 0 ? Cmp(next, p) > 0 : rc == AN_ERR_NOTFOUND && Same(next, untouched),
-                  said());
-        } else if (how == 1 && text) {  // from annotation text to its anchor
-            CHECK(rc == 0 && Same(next, (ANPos{p.itemId, p.subItemId, 0, 0})), said());
-        } else if (!Bound(d)) {
-            CHECK(rc == AN_ERR_NOSTATE, said());
-        } else if (rc == 0) {
-            CHECK(how == 1 ? Cmp(next, p) > 0 && next.kind == 0 && next.textIndex == 0
-                           : next.kind == ANPOS_ANNOTEXT,
-                  said());
-        } else {
-            CHECK(rc == AN_ERR_NOTFOUND, said());
-        }
+        CHECK(how == 0
+                  ? (rc == 0 ? Cmp(next, p) > 0 : rc == AN_ERR_NOTFOUND && Same(next, untouched))
+              : how == 1 && text ? rc == 0 && Same(next, (ANPos{p.itemId, p.subItemId, 0, 0}))
+              : !Bound(d)        ? rc == AN_ERR_NOSTATE
+              : rc != 0          ? rc == AN_ERR_NOTFOUND
+              : how == 1         ? Cmp(next, p) > 0 && next.kind == 0 && next.textIndex == 0
+                                 : next.kind == ANPOS_ANNOTEXT,
+              said);
     }
 }
 
@@ -1025,15 +945,12 @@ void Run::ArmFailure(Document &) {
     armNext_ = true;
     const uint32_t n = 1 + in_.below(48);
     pendingSticky_ = in_.chance(64);
-    const std::string onward = pendingSticky_ ? " and on" : "";
-    if (in_.chance(128)) {
-        pendingAllocation_ = n;
-        trail.back() += ": arm allocation failure " + N(n) + onward;
-        return;
-    }
-    pendingCode_ = in_.chance(128) ? 99 : 1 + in_.below(30);
-    pendingCall_ = n;
-    trail.back() += ": arm module failure " + N(n) + " code " + N(pendingCode_) + onward;
+    const bool allocation = in_.chance(128);
+    if (!allocation) pendingCode_ = in_.chance(128) ? 99 : 1 + in_.below(30);
+    (allocation ? pendingAllocation_ : pendingCall_) = n;
+    trail.back() += (allocation ? ": arm allocation failure "
+                                : ": arm failure code " + N(pendingCode_) + " at call ") +
+                    N(n) + (pendingSticky_ ? " and on" : "");
 }
 
 void Run::Fill(Document &d) {
@@ -1044,24 +961,18 @@ void Run::Fill(Document &d) {
         seed = seed * 1103515245u + 12345u;
         const ANPos at = d.content[(seed >> 8) % d.content.size()];
         const ANPos to = d.content[(seed >> 16) % d.content.size()];
+        const bool ordered = Cmp(at, to) <= 0;
         ANAnnoRecord r{};
-        r.size = AN_RECORD_SIZE_POINT;
-        r.tag = 0x100 + i % 8;
-        r.start = Cmp(at, to) <= 0 ? at : to;
-        r.end = Cmp(at, to) <= 0 ? to : at;
-        r.value = i;
-        r.style = 0x40000000u | (1 + i % 10);
+        r.size = AN_RECORD_SIZE_POINT, r.tag = 0x100 + i % 8, r.start = ordered ? at : to;
+        r.end = ordered ? to : at, r.value = i, r.style = 0x40000000u | (1 + i % 10);
         const uint16_t type = i % 7 == 2 ? AN_TYPE_HILITE : static_cast<uint16_t>(1 + i % 7);
         const uint16_t unit = static_cast<uint16_t>('a' + i % 26);
         ANTextDesc t{48, r.tag, at, 0, &unit, 1, 0};
         ANPointDesc p{32, r.tag, r.start, 0};
-        if (type == AN_TYPE_TEXT) {
-            CALL(ANAddAnno(d.handle, type, &t));
-        } else if (type == AN_TYPE_PLACEHOLDER || type == AN_TYPE_CUTMARK) {
-            CHECK(CALL(ANAddAnno(d.handle, type, &p)) == 0, "adding a filler mark");
-        } else {
-            CHECK(CALL(ANAddAnno(d.handle, type, &r)) == 0, "adding a filler");
-        }
+        const void *desc = type == AN_TYPE_TEXT ? static_cast<const void *>(&t) : &r;
+        if (type == AN_TYPE_PLACEHOLDER || type == AN_TYPE_CUTMARK) desc = &p;
+        const uint32_t rc = CALL(ANAddAnno(d.handle, type, desc));
+        CHECK(type == AN_TYPE_TEXT || rc == 0, "adding a filler gave " + N(rc));
     }
 }
 
@@ -1100,18 +1011,14 @@ void Run::Finish() {
 
 void annofuzz::RunInput(const uint8_t *data, size_t size) {
     Input in(data, size);
-    Run run(in);
-    run.Go();
+    Run(in).Go();
 }
 
 extern "C" int LLVMFuzzerTestOneInput(const uint8_t *data, size_t size) {
     annofuzz::RunInput(data, size);
-    // A line per million calls, so that a long run shows its progress in its log.
-    static uint64_t reported = 0;
-    if (annofuzz::apiCalls / 1000000 > reported) {
-        reported = annofuzz::apiCalls / 1000000;
-        std::fprintf(stderr, "anno_fuzz: %llu API calls so far\n",
-                     static_cast<unsigned long long>(annofuzz::apiCalls));
-    }
+    static uint64_t reported = 0;  // a line per million calls shows a long run's progress
+    if (annofuzz::apiCalls / 1000000 > reported)
+        std::fprintf(stderr, "anno_fuzz: %llu M API calls\n",
+                     static_cast<unsigned long long>(reported = annofuzz::apiCalls / 1000000));
     return 0;
 }

@@ -29,20 +29,14 @@ Style StyleFor(DAHandle doc, uint32_t word) {
     static constexpr uint32_t kPalette[16] = {
         0x000000, 0x000080, 0x008000, 0x008080, 0x800000, 0x800080, 0x808000, 0xC0C0C0,
         0x808080, 0x0000FF, 0x00FF00, 0x00FFFF, 0xFF0000, 0xFF00FF, 0xFFFF00, 0xFFFFFF};
-    if ((word & ANSTYLEWORD_NUMBER) == 0) {
+    if ((word & ANSTYLEWORD_NUMBER) == 0)
         return {(word & ANSTYLEWORD_NOCOLOR1) == 0, (word & ANSTYLEWORD_NOCOLOR2) == 0, 0,
                 kPalette[(word >> 4) & 0xF], kPalette[word & 0xF]};
-    }
     ANHiliteStyle f{};
     if (CALL(ANGetHiliteStyle(doc, word & 0xFFFF, &f)) != 1) return {};
-    auto has = [&](uint32_t flag) -> uint32_t { return (f.flags & flag) != 0; };
-    return {has(ANSTYLE_COLOR1),
-            has(ANSTYLE_COLOR2),
-            has(ANSTYLE_ATTR),
-            f.color1,
-            f.color2,
-            f.attr1,
-            f.attr2};
+    const auto h = [&](uint32_t b) { return (f.flags & b) != 0 ? 1u : 0u; };
+    return Style{h(ANSTYLE_COLOR1), h(ANSTYLE_COLOR2), h(ANSTYLE_ATTR), f.color1,
+                 f.color2,          f.attr1,           f.attr2};
 }
 
 }  // namespace
@@ -68,22 +62,22 @@ void CheckTrackingWalk(DAHandle doc, const ANPos &start, const std::vector<ANPos
         return;
     }
     // The start: the first entry not wholly before it becomes the cursor.
-    CHECK(track.rangeActive == 0 && track.markActive == markLeft, "start's range or mark flags");
-    CHECK(track.color1Set + track.color2Set + track.attrSet == 0, "start's style flags");
-    CHECK(track.hiliteEntry == AN_NONE, "hiliteEntry " + N(track.hiliteEntry));
+    CHECK(track.rangeActive == 0 && track.markActive == markLeft && track.hiliteEntry == AN_NONE &&
+              track.color1Set + track.color2Set + track.attrSet == 0,
+          "start's flags, hiliteEntry " + N(track.hiliteEntry));
     const auto first = std::find_if(list.begin(), list.end(), [&](const Entry &e) {
         return Cmp(e.record.start, start) > 0 || Cmp(e.record.end, start) >= 0;
     });
     if (first == list.end()) {
-        CHECK(started == ANTRACK_NOMORE, "state " + N(started) + ", everything ends before");
-        CHECK(track.cursor == AN_NONE, "cursor " + N(track.cursor));
-        CHECK(SameAnchor(track.nextChange, kEnd), "nextChange " + Text(track.nextChange));
+        CHECK(started == ANTRACK_NOMORE && track.cursor == AN_NONE &&
+                  SameAnchor(track.nextChange, kEnd),
+              "state " + N(started) + " cursor " + N(track.cursor) + ", everything ends before");
     } else {
-        CHECK(started == ANTRACK_ACTIVE, "state " + N(started));
-        CHECK(track.cursor == first->slot, "cursor " + N(track.cursor) + ", not " + N(first->slot));
         const ANPos &expected = Cmp(first->record.start, start) < 0 ? start : first->record.start;
-        CHECK(Cmp(track.nextChange, expected) == 0,
-              "nextChange " + Text(track.nextChange) + ", not " + Text(expected));
+        CHECK(started == ANTRACK_ACTIVE && track.cursor == first->slot &&
+                  Cmp(track.nextChange, expected) == 0,
+              "state " + N(started) + " cursor " + N(track.cursor) + " nextChange " +
+                  Text(track.nextChange));
     }
     // The range, mark and highlight bits the last full call (or the start) leaves to be
     // reported once more, and what covered its position (nothing, before the first change).
@@ -92,86 +86,64 @@ void CheckTrackingWalk(DAHandle doc, const ANPos &start, const std::vector<ANPos
     for (const ANPos &p : positions) {
         SetContext("tracking walk from " + Text(start) + ", at " + Text(p));
         std::vector<uint16_t> cover;
-        for (const Entry &e : list) {
+        for (const Entry &e : list)
             if (Covers(e.record, p)) cover.push_back(e.slot);
-        }
         const ANTrackInfo before = track;
         const bool full = Cmp(p, before.nextChange) >= 0;
         const uint32_t bits = CALL(ANTrackAnno(doc, &p, &track));
         if (!full) {
-            CHECK(bits == 0, "bits " + N(bits) + " before nextChange " + Text(before.nextChange));
-            CHECK(std::memcmp(&before, &track, sizeof track) == 0,
-                  "record changed before nextChange");
-            CHECK(cover == lastCover, "covering entries changed before nextChange, unreported");
+            CHECK(
+                bits == 0 && std::memcmp(&before, &track, sizeof track) == 0 && cover == lastCover,
+                "bits " + N(bits) + ", record or cover changed before nextChange");
             continue;
         }
-        uint64_t userData = before.userData;
-        if ((carried & ANTRACK_BIT_RANGE) != 0 && before.cursor != AN_NONE) {
-            CHECK(at[before.cursor] >= 0, "cursor " + N(before.cursor) + " names no entry");
-            userData = list[at[before.cursor]].record.userData;
-        }
-        const annotest::CoverReading<Entry> r =
-            annotest::ReadCover(annotest::CoverReading<Entry>{carried, userData, before.value,
-                                                              before.textBuffer, before.textLength},
-                                cover, list, at);
-        CHECK(bits == r.bits, "bits " + N(bits) + ", expected " + N(r.bits));
-        CHECK(track.rangeActive == (r.range ? 1u : 0u), "rangeActive " + N(track.rangeActive));
-        CHECK(track.markActive == (r.mark ? 1u : 0u), "markActive " + N(track.markActive));
-        CHECK(track.value == r.value, "value " + N(track.value) + ", expected " + N(r.value));
-        CHECK(track.textBuffer == r.text && track.textLength == r.textLength, "text of last text");
-        CHECK(track.userData == r.userData,
-              "userData " + N(track.userData) + ", not " + N(r.userData));
-        const uint16_t hiliteSlot = r.hilite == nullptr ? AN_NONE : r.hilite->slot;
-        CHECK(track.hiliteEntry == hiliteSlot,
-              "hiliteEntry " + N(track.hiliteEntry) + ", expected " + N(hiliteSlot));
-        if (r.hilite == nullptr) {
-            CHECK(track.color1Set + track.color2Set + track.attrSet == 0, "style flags left set");
-        } else {
-            const Style s = StyleFor(doc, r.hilite->record.style);
-            CHECK(track.color1Set == s.color1Set && track.color2Set == s.color2Set &&
-                      track.attrSet == s.attrSet,
-                  "style flags of word " + N(r.hilite->record.style));
-            CHECK(!s.color1Set || track.color1 == s.color1, "color1 " + N(track.color1));
-            CHECK(!s.color2Set || track.color2 == s.color2, "color2 " + N(track.color2));
-            CHECK(!s.attrSet || (track.attr1 == s.attr1 && track.attr2 == s.attr2), "attributes");
-        }
-        // The cursor stays while its entry runs on past p; otherwise it moves on to
-        // the next entry not wholly before p.
         size_t cursorAt = list.size();
         if (before.cursor != AN_NONE) {
             CHECK(at[before.cursor] >= 0, "cursor " + N(before.cursor) + " names no entry");
             cursorAt = static_cast<size_t>(at[before.cursor]);
         }
+        const bool rangeOn = (carried & ANTRACK_BIT_RANGE) != 0 && cursorAt < list.size();
+        const uint64_t userData = rangeOn ? list[cursorAt].record.userData : before.userData;
+        const annotest::CoverReading<Entry> r =
+            annotest::ReadCover(annotest::CoverReading<Entry>{carried, userData, before.value,
+                                                              before.textBuffer, before.textLength},
+                                cover, list, at);
+        const uint16_t hiliteSlot = r.hilite == nullptr ? AN_NONE : r.hilite->slot;
+        CHECK(bits == r.bits && track.rangeActive == (r.range ? 1u : 0u) &&
+                  track.markActive == (r.mark ? 1u : 0u) && track.value == r.value &&
+                  track.textBuffer == r.text && track.textLength == r.textLength &&
+                  track.userData == r.userData && track.hiliteEntry == hiliteSlot,
+              "bits " + N(bits) + ", expected " + N(r.bits) + "; or a field of the record");
+        const Style s = r.hilite == nullptr ? Style{} : StyleFor(doc, r.hilite->record.style);
+        CHECK(track.color1Set == s.color1Set && track.color2Set == s.color2Set &&
+                  track.attrSet == s.attrSet && (!s.color1Set || track.color1 == s.color1) &&
+                  (!s.color2Set || track.color2 == s.color2) &&
+                  (!s.attrSet || (track.attr1 == s.attr1 && track.attr2 == s.attr2)),
+              "style flags or colours of the highlight in force");
+        // The cursor stays while its entry runs on past p; otherwise it moves on to
+        // the next entry not wholly before p.
         if (cursorAt == list.size() || Cmp(list[cursorAt].record.end, p) <= 0) {
             size_t i = before.cursor == AN_NONE ? 0 : cursorAt + 1;
             while (i < list.size() && Cmp(list[i].record.start, p) <= 0 &&
-                   Cmp(list[i].record.end, p) < 0) {
+                   Cmp(list[i].record.end, p) < 0)
                 ++i;
-            }
             cursorAt = i;
         }
         const uint16_t cursorSlot = cursorAt == list.size() ? AN_NONE : list[cursorAt].slot;
         CHECK(track.cursor == cursorSlot, "cursor " + N(track.cursor) + ", not " + N(cursorSlot));
         // nextChange: the nearest start or end after p, or p when the cursor ends there.
         const ANPos *nearest = nullptr;
-        for (const Entry &e : list) {
-            for (const ANPos *q : {&e.record.start, &e.record.end}) {
+        for (const Entry &e : list)
+            for (const ANPos *q : {&e.record.start, &e.record.end})
                 if (Cmp(*q, p) > 0 && (nearest == nullptr || Cmp(*q, *nearest) < 0)) nearest = q;
-            }
-        }
-        auto next = [&] { return "nextChange " + Text(track.nextChange); };
-        if (cursorAt == list.size()) {
-            CHECK(nearest == nullptr, "no cursor though an annotation lies ahead");
-            CHECK(Same(track.nextChange, (ANPos{kEnd.itemId, kEnd.subItemId, before.nextChange.kind,
-                                                before.nextChange.textIndex})),
-                  next() + " past the end");
-        } else if (Cmp(list[cursorAt].record.start, p) <= 0 &&
-                   Cmp(list[cursorAt].record.end, p) == 0) {
-            CHECK(Cmp(track.nextChange, p) == 0, next());
-        } else {
-            CHECK(nearest != nullptr, "a cursor though nothing lies ahead");
-            CHECK(Cmp(track.nextChange, *nearest) == 0, next() + ", not " + Text(*nearest));
-        }
+        const ANPos pastEnd{kEnd.itemId, kEnd.subItemId, before.nextChange.kind,
+                            before.nextChange.textIndex};
+        const bool endsAtP = cursorAt < list.size() && Cmp(list[cursorAt].record.start, p) <= 0 &&
+                             Cmp(list[cursorAt].record.end, p) == 0;
+        CHECK(cursorAt == list.size() ? nearest == nullptr && Same(track.nextChange, pastEnd)
+              : endsAtP               ? Cmp(track.nextChange, p) == 0
+                                      : nearest != nullptr && Cmp(track.nextChange, *nearest) == 0,
+              "nextChange " + Text(track.nextChange) + " with cursor " + N(cursorSlot));
         carried = (r.range ? ANTRACK_BIT_RANGE : 0) | (r.mark ? ANTRACK_BIT_CUTMARK : 0) |
                   (r.hilite != nullptr ? ANTRACK_BIT_HILITE : 0);
         lastCover = cover;
@@ -210,8 +182,7 @@ void CheckTextReads(DAHandle doc, const std::vector<ANPos> &positions) {
             CHECK(range(before.firstPos, before.lastPos),
                   "the cached range moved on a cached read");
         } else if (!bound) {
-            CHECK(rc == AN_ERR_NOSTATE, "result " + N(rc) + " without annotation state");
-            CHECK(unit == 0xABCD, "unit written " + N(unit));
+            CHECK(rc == AN_ERR_NOSTATE && unit == 0xABCD, "result " + N(rc) + " without state");
             continue;
         } else {
             cache.clear();
@@ -240,8 +211,8 @@ void CheckTextReads(DAHandle doc, const std::vector<ANPos> &positions) {
             }
             sum += units(seg);
         }
-        CHECK(rc == expected, "result " + N(rc) + ", expected " + N(expected));
-        CHECK(unit == expectedUnit, "unit " + N(unit) + ", expected " + N(expectedUnit));
+        CHECK(rc == expected && unit == expectedUnit,
+              "result " + N(rc) + " unit " + N(unit) + ", expected " + N(expected));
     }
     CHECK(CALL(ANEndAnnoTextTrack(doc, &track)) == 0, "ending a text track");
     CHECK(track.segs == nullptr && range(zero, zero), "an ended text track is all zero");
@@ -278,7 +249,7 @@ void CheckEvent(const std::vector<Entry> &list, uint32_t event, uint16_t entry, 
         return;
     }
     CHECK(notes.size() == expected.size(),
-          N(notes.size()) + " deliveries, expected " + N(expected.size()));
+          N(notes.size()) + " deliveries of " + N(expected.size()));
     for (size_t i = 0; i < notes.size(); ++i) {
         const Note &n = notes[i];
         const auto [code, e] = expected[i];
@@ -349,13 +320,11 @@ uint32_t ExpectedFind(DAHandle doc, uint16_t flags, const ANFindRecord &find, AN
     if (found == nullptr) return AN_ERR_NOTFOUND;
     *out = find;
     const ANAnnoRecord &r = found->record;
-    out->foundTag = r.tag;
-    out->foundUserData = r.userData;
-    out->foundStart = r.start;
-    out->foundEnd = r.end;
-    if (found->type != AN_TYPE_TEXT && found->type != AN_TYPE_PLACEHOLDER) return 0;
+    out->foundTag = r.tag, out->foundUserData = r.userData, out->foundStart = r.start;
+    const bool text = found->type == AN_TYPE_TEXT || found->type == AN_TYPE_PLACEHOLDER;
+    out->foundEnd = text ? r.start : r.end;
+    if (!text) return 0;
     const uint32_t units = found->type == AN_TYPE_TEXT ? r.textLength : 1;
-    out->foundEnd = r.start;
     if (r.start.kind == ANPOS_ANNOTEXT) {
         out->foundStart.textIndex = r.start.textIndex - units;
         return 0;

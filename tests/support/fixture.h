@@ -20,8 +20,8 @@
 #define ANNO_HAVE_PLATFORM_CONTROLS 0
 #endif
 
-// Skips a test that needs the block counters or failure injection of the platform
-// layer, which the system's own heap (Windows) does not offer.
+// Skips a test that needs the platform layer's block counters or failure injection,
+// which the system's own heap (Windows) does not offer.
 #if ANNO_HAVE_PLATFORM_CONTROLS
 #define ANNO_REQUIRE_PLATFORM_CONTROLS() (void)0
 #else
@@ -31,7 +31,7 @@
 
 namespace annotest {
 
-// Counts live heap and global-memory blocks at set-up and checks them at tear-down.
+// Checks at tear-down that the live block counts are back where they started.
 class LeakCheckedTest : public ::testing::Test {
  protected:
     void SetUp() override;
@@ -83,16 +83,14 @@ uint32_t AddText(DAHandle doc, const ANPos &pos, std::u16string_view text, uint3
 uint32_t AddMark(DAHandle doc, uint16_t type, const ANPos &pos, uint32_t tag = 1,
                  uint64_t userData = 0);
 
-// One call of the notification callback, with a copy of the record it was given.
-struct Notification {
+struct Notification {  // one call of the callback, with a copy of its record
     uint16_t code;
     uint16_t detail;
     ANAnnoRecord record;  // codes 1 and 2
     ANEventRec event;     // code 3
 };
 
-// Records every notification; Attach installs it as the document's callback.
-struct Notifications {
+struct Notifications {  // records every notification; Attach makes it the callback
     std::vector<Notification> calls;
     uint32_t result = 0;  // what the callback returns
 
@@ -102,7 +100,6 @@ struct Notifications {
 
 }  // namespace annotest
 
-// Positions print readably in failure messages.
 void PrintTo(const ANPos &pos, std::ostream *os);
 bool operator==(const ANPos &a, const ANPos &b);
 

@@ -17,8 +17,7 @@ const ANInstance *InstanceOf(DAHandle doc) {
 }
 
 const ANEntryTable *TableOf(DAHandle doc) {
-    const ANInstance *instance = InstanceOf(doc);
-    return instance == nullptr ? nullptr : instance->entries;
+    return InstanceOf(doc) ? InstanceOf(doc)->entries : nullptr;
 }
 
 // Walks one list from `head`, marking its slots in `seen` with `mark`; checks the
@@ -42,24 +41,24 @@ std::string WalkList(const ANEntryTable *t, uint16_t head, uint16_t tail, int ma
 
 std::string TableRulesBroken(const ANEntryTable *t) {
     const uint32_t capacity = t->capacity;
-    if (capacity == 0 || capacity % ANTABLE_GROWTH != 0 || capacity > ANTABLE_MAX_CAPACITY) {
+    if (capacity == 0 || capacity % ANTABLE_GROWTH != 0 || capacity > ANTABLE_MAX_CAPACITY)
         return "capacity " + std::to_string(capacity);
-    }
     std::vector<int> seen(capacity, 0);
-    uint32_t listed = 0;
-    uint32_t free = 0;
+    uint32_t listed = 0, free = 0;
     std::string why = WalkList(t, t->first, t->last, 1, "ordered list", seen, &listed);
     if (why.empty()) why = WalkList(t, t->freeFirst, t->freeLast, 2, "free list", seen, &free);
     if (!why.empty()) return why;
     if (listed + free != capacity) return "the lists do not cover every slot";
-    if (t->count != listed) return "count " + std::to_string(t->count) + " is not the list's length";
+    if (t->count != listed)
+        return "count " + std::to_string(t->count) + " is not the list's length";
     if (free == 0) return "no free slot left";
     if (t->full != 0 && free != 1) return "full set with " + std::to_string(free) + " free slots";
     bool text = false;
     const ANEntry *before = nullptr;
     for (uint16_t i = t->first; i != AN_NONE; i = ANSlot(t, i).next) {
         const ANEntry &e = ANSlot(t, i);
-        const std::string slot = "slot " + std::to_string(i) + " (type " + std::to_string(e.type) + ")";
+        const std::string slot =
+            "slot " + std::to_string(i) + " (type " + std::to_string(e.type) + ")";
         if (e.type < AN_TYPE_HILITE || e.type > AN_TYPE_CUTMARK) return slot + " has a bad type";
         if (ANCompPos(&e.record.start, &e.record.end) > 0) return slot + " starts after its end";
         if (before != nullptr && ANCompPos(&e.record.start, &before->record.start) < 0) {
@@ -67,8 +66,8 @@ std::string TableRulesBroken(const ANEntryTable *t) {
         }
         text |= e.type == AN_TYPE_TEXT || e.type == AN_TYPE_PLACEHOLDER;
         const ANAnnoRecord &r = e.record;
-        if (e.type == AN_TYPE_TEXT && (r.textBuffer == nullptr || r.textCapacity <= r.textLength ||
-                                       r.text != nullptr)) {
+        if (e.type == AN_TYPE_TEXT &&
+            (r.textBuffer == nullptr || r.textCapacity <= r.textLength || r.text != nullptr)) {
             return slot + " does not own a text buffer longer than its text";
         }
         before = &e;
@@ -107,28 +106,20 @@ std::vector<uint8_t> TableBytes(DAHandle doc) {
 }
 
 uint16_t HoverEntry(DAHandle doc, ANPos *pos) {
-    const ANInstance *instance = InstanceOf(doc);
-    *pos = instance != nullptr ? instance->hoverPos : ANPos{};
-    return instance != nullptr ? instance->hoverEntry : AN_NONE;
+    const ANInstance *in = InstanceOf(doc);
+    *pos = in != nullptr ? in->hoverPos : ANPos{};
+    return in != nullptr ? in->hoverEntry : AN_NONE;
 }
 
-uint32_t BuildCursor(DAHandle doc) {
-    const ANInstance *instance = InstanceOf(doc);
-    return instance != nullptr ? instance->buildCursor : 0;
-}
+uint32_t BuildCursor(DAHandle doc) { return InstanceOf(doc) ? InstanceOf(doc)->buildCursor : 0; }
 
 std::string DocumentRulesBroken(DAHandle doc) {
     const ANInstance *instance = InstanceOf(doc);
     if (instance == nullptr) return {};
-    const ANEntryTable *t = instance->entries;
-    if (t != nullptr) {
-        std::string why = TableRulesBroken(t);
-        if (!why.empty()) return why;
-    }
-    if (instance->hoverEntry == AN_NONE) return {};
-    for (const Entry &e : ListEntries(doc)) {
+    const std::string why = instance->entries ? TableRulesBroken(instance->entries) : "";
+    if (!why.empty() || instance->hoverEntry == AN_NONE) return why;
+    for (const Entry &e : ListEntries(doc))
         if (e.slot == instance->hoverEntry) return {};
-    }
     return "hover entry " + std::to_string(instance->hoverEntry) + " is not listed";
 }
 
@@ -145,7 +136,8 @@ std::u16string AnchorText(const std::vector<Entry> &list, const ANPos &anchor,
 }
 
 uint64_t NewHeapBlock(size_t bytes) {
-    return static_cast<uint64_t>(reinterpret_cast<uintptr_t>(HeapAlloc(GetProcessHeap(), 0, bytes)));
+    return static_cast<uint64_t>(
+        reinterpret_cast<uintptr_t>(HeapAlloc(GetProcessHeap(), 0, bytes)));
 }
 
 void FreeHeapBlock(uint64_t block) {

@@ -13,22 +13,15 @@ namespace annotest {
 
 // The tracking bit an annotation type is reported with (0 for a type without one).
 inline uint32_t TrackBitOf(uint16_t type) {
-    switch (type) {
-        case AN_TYPE_HILITE:
-            return ANTRACK_BIT_HILITE;
-        case AN_TYPE_POINT:
-            return ANTRACK_BIT_POINT;
-        case AN_TYPE_RANGE:
-            return ANTRACK_BIT_RANGE;
-        case AN_TYPE_VALUE:
-            return ANTRACK_BIT_VALUE;
-        case AN_TYPE_TEXT:
-            return ANTRACK_BIT_TEXT;
-        case AN_TYPE_CUTMARK:
-            return ANTRACK_BIT_CUTMARK;
-        default:
-            return 0;
-    }
+    constexpr uint32_t kBits[] = {0,
+                                  ANTRACK_BIT_HILITE,
+                                  ANTRACK_BIT_POINT,
+                                  ANTRACK_BIT_RANGE,
+                                  ANTRACK_BIT_VALUE,
+                                  ANTRACK_BIT_TEXT,
+                                  0,
+                                  ANTRACK_BIT_CUTMARK};
+    return type < 8 ? kBits[type] : 0;
 }
 
 // Whether highlight `e` keeps out of the way of `h`, the one in force: it runs on
