@@ -101,8 +101,9 @@ void CheckTrackingWalk(DAHandle doc, const ANPos &start, const std::vector<ANPos
                        uint32_t markLeft);
 
 // Reads annotation text at each of `positions` through one fresh text track and checks
-// every answer (result, unit, cached range) against the table.
-void CheckTextReads(DAHandle doc, const std::vector<ANPos> &positions);
+// every answer (result, unit, cached range) against the table; with `faulty` (a failure
+// armed) the first failure's code ends the reads.
+void CheckTextReads(DAHandle doc, const std::vector<ANPos> &positions, bool faulty);
 
 struct Note {  // one notification the callback received
     uint16_t code, detail;
