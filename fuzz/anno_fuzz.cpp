@@ -100,7 +100,7 @@ struct Document {
     std::set<uint64_t> blocks;  // userData blocks handed to this document, still live
     ANTrackInfo stale{};        // a tracking record kept across changes
     ANAnnoTextTrack staleText{};
-    bool staleTextStarted = false;
+    bool staleTextStarted = false, mixedText = false;  // mixed: copied into while holding some
 };
 
 bool Bound(const Document &d) { return antk::annoSlot(d.handle) != nullptr; }
@@ -498,7 +498,8 @@ void Run::Add(Document &d) {
 void Run::CheckAdded(Document &d, uint16_t type, const ANPos &at, const std::vector<Entry> &before,
                      const std::vector<uint16_t> &text, const ANAnnoRecord *heard) {
     const std::vector<Entry> after = ListEntries(d.handle);
-    bool plain = at.kind == 0 || at.kind == ANPOS_ANNOTEXT;  // not a kind of the caller's own
+    // Not at a kind of the caller's own, nor where copying mixed texts at one anchor (left open).
+    bool plain = !d.mixedText && (at.kind == 0 || at.kind == ANPOS_ANNOTEXT);
     for (const Entry &e : before) plain &= e.record.start.kind == 0 || e.record.start.kind == 5;
     if ((type == AN_TYPE_TEXT || type == AN_TYPE_PLACEHOLDER) && plain) {
         std::u16string expected = AnchorText(before, at);
@@ -797,6 +798,7 @@ void Run::Copy(Document &) {
     // would only measure that.
     if (source.size() + target.size() > 1500) return;
     const uint32_t rc = CALL(ANCopyAnnos(dest->handle, src->handle));
+    dest->mixedText |= src != dest && (src->mixedText || !target.empty());
     CHECK(dest->recorder.notes.empty() && src->recorder.notes.empty(), "copying notified");
     if (src != dest)
         CHECK(SameListing(source, ListEntries(src->handle)), "copying changed the source");
