@@ -484,8 +484,9 @@ void Run::Add(Document &d) {
     } else {
         CHECK(notes.empty(), "notified without a callback");
     }
+    if (rc == 0 && Bound(d))  // also when a failure was armed: an add that succeeds is whole
+        CheckAdded(d, type, start, before, text, d.callback ? &notes[0].record : nullptr);
     if (Unheld(d, rc == AN_ERR_NOSTATE || rc == AN_ERR_BADARG, rc)) return;
-    if (rc == 0) CheckAdded(d, type, start, before, text, d.callback ? &notes[0].record : nullptr);
     const bool nullText = type == AN_TYPE_TEXT && textPointer == nullptr && !text.empty();
     CHECK(rc == AN_ERR_BADARG || (rc == 0 && !nullText), "adding gave " + N(rc));
     CHECK(rc == 0 || SameListing(before, ListEntries(d.handle)), "a refused add changed the table");
