@@ -27,11 +27,11 @@ std::string WalkList(const ANEntryTable *t, uint16_t head, uint16_t tail, int ma
     uint16_t before = AN_NONE;
     *length = 0;
     for (uint16_t i = head; i != AN_NONE; i = ANSlot(t, i).next) {
-        const std::string slot = std::string(name) + ": slot " + std::to_string(i);
-        if (i >= t->capacity) return slot + " out of range";
-        if (seen[i] != 0) return slot + " met twice or in both lists";
+        auto slot = [&] { return std::string(name) + ": slot " + std::to_string(i); };
+        if (i >= t->capacity) return slot() + " out of range";
+        if (seen[i] != 0) return slot() + " met twice or in both lists";
         seen[i] = mark;
-        if (ANSlot(t, i).prev != before) return slot + " has a wrong prev link";
+        if (ANSlot(t, i).prev != before) return slot() + " has a wrong prev link";
         before = i;
         ++*length;
     }
@@ -57,18 +57,18 @@ std::string TableRulesBroken(const ANEntryTable *t) {
     const ANEntry *before = nullptr;
     for (uint16_t i = t->first; i != AN_NONE; i = ANSlot(t, i).next) {
         const ANEntry &e = ANSlot(t, i);
-        const std::string slot =
-            "slot " + std::to_string(i) + " (type " + std::to_string(e.type) + ")";
-        if (e.type < AN_TYPE_HILITE || e.type > AN_TYPE_CUTMARK) return slot + " has a bad type";
-        if (ANCompPos(&e.record.start, &e.record.end) > 0) return slot + " starts after its end";
-        if (before != nullptr && ANCompPos(&e.record.start, &before->record.start) < 0) {
-            return slot + " starts at " + PosText(e.record.start) + ", before the entry ahead";
-        }
+        auto slot = [&] {
+            return "slot " + std::to_string(i) + ", type " + std::to_string(e.type);
+        };
+        if (e.type < AN_TYPE_HILITE || e.type > AN_TYPE_CUTMARK) return slot() + " has a bad type";
+        if (ANCompPos(&e.record.start, &e.record.end) > 0) return slot() + " starts after its end";
+        if (before != nullptr && ANCompPos(&e.record.start, &before->record.start) < 0)
+            return slot() + " starts at " + PosText(e.record.start) + ", before the entry ahead";
         text |= e.type == AN_TYPE_TEXT || e.type == AN_TYPE_PLACEHOLDER;
         const ANAnnoRecord &r = e.record;
         if (e.type == AN_TYPE_TEXT &&
             (r.textBuffer == nullptr || r.textCapacity <= r.textLength || r.text != nullptr)) {
-            return slot + " does not own a text buffer longer than its text";
+            return slot() + " does not own a text buffer longer than its text";
         }
         before = &e;
     }
