@@ -101,6 +101,7 @@ struct Document {
     ANTrackInfo stale{};        // a tracking record kept across changes
     ANAnnoTextTrack staleText{};
     bool staleTextStarted = false, mixedText = false;  // mixed: copied into while holding some
+    bool noStylesMaybe = false;  // bound under a failure: its style table may not exist
 };
 
 bool Bound(const Document &d) { return antk::annoSlot(d.handle) != nullptr; }
@@ -327,6 +328,7 @@ void Run::Bind(Document &d, bool callback) {
     d.callback = callback;
     const uint32_t rc = CALL(ANInit(d.handle, in_.chance(200) ? global_ : nullptr,
                                     callback ? Notify : nullptr, &d.recorder));
+    d.noStylesMaybe = faulty_;
     if (!faulty_) CHECK(rc == 0 && Bound(d), "ANInit gave " + N(rc));
 }
 
@@ -774,6 +776,8 @@ void Run::Styles(Document &d) {
     const uint32_t rc =
         CALL(global ? ANAddGlobalHiliteStyle(global_, &style) : ANAddHiliteStyle(d.handle, &style));
     if (faulty_) return;
+    if (!global && d.noStylesMaybe && rc == AN_ERR_BADARG) return;  // it may have no style table
+    if (!global && rc == 0) d.noStylesMaybe = false;
     const uint32_t want = global      ? (global_ == nullptr || !good ? AN_ERR_BADARG : 0)
                           : !Bound(d) ? AN_ERR_NOSTATE
                           : !good     ? AN_ERR_BADARG
