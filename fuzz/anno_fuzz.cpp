@@ -175,6 +175,21 @@ std::vector<std::pair<ANPos, uint32_t>> TextAnchors(const std::vector<Entry> &li
     return out;
 }
 
+// The first annotation-text position after `p`: the next unit of p's own text, or the
+// first of the text at the first anchor after p's (empty text too). `open`: an anchor
+// sorts with p's without being it ((i, 0xFFFFFFFF) and (i, 0)), where this is not held.
+bool NextTextPos(const std::vector<Entry> &list, const ANPos &p, ANPos *next, bool *open) {
+    bool found = false;
+    for (const auto &[a, units] : TextAnchors(list)) {
+        ANPos at{a.itemId, a.subItemId, ANPOS_ANNOTEXT, 0};
+        *open |= !SameAnchor(a, p) && Cmp(at, ANPos{p.itemId, p.subItemId, ANPOS_ANNOTEXT, 0}) == 0;
+        if (SameAnchor(a, p) && p.kind == ANPOS_ANNOTEXT) at.textIndex = p.textIndex + 1;
+        if (at.textIndex == 0 ? Cmp(at, p) <= 0 : at.textIndex >= units) continue;
+        if (!found || Cmp(at, *next) < 0) *next = at, found = true;
+    }
+    return found;
+}
+
 ANPos PickPos(Input &in, const Document &d) {
     const uint32_t how = in.below(20);
     if (how < 9) {
@@ -903,6 +918,10 @@ void Run::Step(Document &d) {
               : how == 1         ? Cmp(next, p) > 0 && next.kind == 0 && next.textIndex == 0
                                  : next.kind == ANPOS_ANNOTEXT,
               said);
+        ANPos want{};
+        bool open = false;
+        const bool some = how == 2 && NextTextPos(ListEntries(d.handle), p, &want, &open);
+        CHECK(how != 2 || open || (rc == 0 ? some && Same(next, want) : !some), said);
     }
 }
 

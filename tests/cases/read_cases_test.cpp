@@ -63,16 +63,18 @@ DAHandle Made(const Str &layout, const Str &prep = "", ANStyleTable *g = nullptr
     for (const char *s = prep.c_str(); *s != 0; s += *s == ' ') {
         const char k = *s++;
         const ANPos a = ParsePos(s), z = *s == '-' ? ParsePos(++s) : a;
-        uint32_t tag = 3, arg = 0;
-        for (char *e = nullptr; *s == '#' || *s == '/'; s = e)
-            (*s == '#' ? tag : arg) = static_cast<uint32_t>(std::strtoul(s + 1, &e, 16));
-        EXPECT_EQ(k == 'R'               ? AddRange(doc, a, z, tag, arg)
-                  : k == 'M' || k == 'P' ? AddMark(doc, k == 'M' ? 7 : 6, a, tag)
-                  : k == 'T' || k == 'E' ? AddText(doc, a, k == 'T' ? u"ab" : u"", tag, arg)
-                  : k == 'H'             ? AddHilite(doc, a, z, tag, arg)
-                  : k == 'C'             ? ANClearAnnos(doc, ANCLEAR_EQUAL, tag)
-                                         : AddPoint(doc, a, tag, arg, k == 'O' ? 2 : 4),
-                  AN_OK);
+        uint32_t v[] = {3, 0, 1};  // "#tag", "/arg" (hex), "*times" (a big table: "*300")
+        for (char *e = nullptr; *s != 0 && std::strchr("#/*", *s) != nullptr; s = e)
+            v[std::strchr("#/*", *s) - "#/*"] = std::strtoul(s + 1, &e, *s == '*' ? 10 : 16);
+        const uint32_t tag = v[0], arg = v[1];
+        for (uint32_t n = 0; n < v[2]; ++n)
+            EXPECT_EQ(k == 'R'               ? AddRange(doc, a, z, tag, arg)
+                      : k == 'M' || k == 'P' ? AddMark(doc, k == 'M' ? 7 : 6, a, tag)
+                      : k == 'T' || k == 'E' ? AddText(doc, a, k == 'T' ? u"ab" : u"", tag, arg)
+                      : k == 'H'             ? AddHilite(doc, a, z, tag, arg)
+                      : k == 'C'             ? ANClearAnnos(doc, ANCLEAR_EQUAL, tag)
+                                             : AddPoint(doc, a, tag, arg, k == 'O' ? 2 : 4),
+                      AN_OK);
     }
     return doc;
 }
@@ -194,6 +196,7 @@ TEST_F(ReadCases, Rows) {
         "....cS....||r 1-8|R1-4 M4 R6-8", "..SSc....||r 0-7|R0-2 M4 R5-7", ten + "M3|r 3-5|m3 R4-5",
         "..pq.Sc..||r 1-8|R1-5 M6 R7-8", ten + "M5 M6|r 2-7|R2-7 m5 m6", "....c....||r 4-7|M4 R5-7",
         ten + "M3 R3-5|r 4-7|m3 R4-7", ten + "M6|r 6.0-8|m6 R6.0-8", ten + "R2-7|r 3-5|R2-7 R4-5",
+        ten + "O9*300 M3 R3-5|r 4-7|m3 R4-7", ten + "O9*300 R2-7|r 3-5|R2-7 R4-5",
         "...S......|T3|r 3:0-6|R4-6", ten + "R3-6 P4|r 1-8|R1-8", "....SS....||r 1-5|R1-4",
         "..SsS.....||r 2-4|R3-4", "....c....||r 2-2|R2-3", "....c....||r 4-4|R4-5",
         "..Ss.....||r 2-6|R4-6", ten + "H1-4|r 2-5|R2-5", ten + "R0-2|r 2-4|R0-4",
