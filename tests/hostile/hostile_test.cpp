@@ -83,6 +83,9 @@ class Hostile : public LeakCheckedTest {
 TEST_F(Hostile, EveryExportAnswersHostileArgumentsAsDocumented) {
     const ANAnnoRecord point{72, 1, Pos(14), Pos(14), 0, 0, 0, 0, {}, 0, 0, nullptr, 0, 0};
     const ANTextDesc nullText{sizeof(ANTextDesc), 1, Pos(2), 0, nullptr, 3, 0};
+    const uint16_t unit = 'u';  // text of 2^32 - 64 units and more has no 32-bit capacity
+    const ANTextDesc huge{sizeof(ANTextDesc), 1, Pos(12), 0, &unit, ~63u, 0},
+        on6{huge.size, 1, Pos(6), 0, &unit, ~0u, 0};
     const std::vector<Entry> list = ListEntries(doc_);
     std::vector<bool> listed(AN_NONE + 1);
     for (const Entry &e : list) listed[e.slot] = true;
@@ -101,6 +104,7 @@ TEST_F(Hostile, EveryExportAnswersHostileArgumentsAsDocumented) {
         ROW(25, 25, 25, 25, All({ANNextPos(d, nullptr, &r.to), ANNextPos(d, &r.at, nullptr)})),
         ROW(25, 25, kWrote, kWrote, Kept(ANPos{}, ANNextPos, d, &r.at)),
         ROW(15, 18, 15, 15, All({ANMapPosition(d, nullptr), ANAddHiliteStyle(d, nullptr)})),
+        ROW(15, 18, 13, 13, All({ANAddAnno(d, 5, &huge), ANAddAnno(d, 5, &on6)})),
         ROW(15, 18, 25, 25, All({ANNextChunkerPos(d, &r.past, &r.to), ANNextAnnoTextPos(d, &r.past,
             &r.to), Kept(ANMapRecord{ANMAPRECORD_SIZE, 1, {}, 0}, ANMapPosition, d)})),
         ROW(15, X, X, X, All({ANInitGlobalHiliteStyles(nullptr),
