@@ -175,14 +175,20 @@ std::vector<std::pair<ANPos, uint32_t>> TextAnchors(const std::vector<Entry> &li
     return out;
 }
 
+// (i, 0xFFFFFFFF) and (i, 0): two anchors that sort as one.
+bool Siblings(const ANPos &a, const ANPos &b) {
+    return a.itemId == b.itemId && (a.subItemId ^ b.subItemId) == ~0u &&
+           a.subItemId * b.subItemId == 0;
+}
+
 // The first annotation-text position after `p`: the next unit of p's own text, or the
-// first of the text at the first anchor after p's (empty text too). `open`: an anchor
-// sorts with p's without being it ((i, 0xFFFFFFFF) and (i, 0)), where this is not held.
+// first of the text at the first anchor after p's (empty text too). `open`: p's anchor has
+// a sibling with text, where this is not held.
 bool NextTextPos(const std::vector<Entry> &list, const ANPos &p, ANPos *next, bool *open) {
     bool found = false;
     for (const auto &[a, units] : TextAnchors(list)) {
         ANPos at{a.itemId, a.subItemId, ANPOS_ANNOTEXT, 0};
-        *open |= !SameAnchor(a, p) && Cmp(at, ANPos{p.itemId, p.subItemId, ANPOS_ANNOTEXT, 0}) == 0;
+        *open |= Siblings(a, p);
         if (SameAnchor(a, p) && p.kind == ANPOS_ANNOTEXT) at.textIndex = p.textIndex + 1;
         if (at.textIndex == 0 ? Cmp(at, p) <= 0 : at.textIndex >= units) continue;
         if (!found || Cmp(at, *next) < 0) *next = at, found = true;
@@ -516,9 +522,11 @@ void Run::Add(Document &d) {
 void Run::CheckAdded(Document &d, uint16_t type, const ANPos &at, const std::vector<Entry> &before,
                      const std::vector<uint16_t> &text, const ANAnnoRecord *heard) {
     const std::vector<Entry> after = ListEntries(d.handle);
-    // Not at a kind of the caller's own, nor where copying mixed texts at one anchor (left open).
+    // Not at a kind of the caller's own, nor where copying mixed texts at one anchor, ...
     bool plain = !d.mixedText && (at.kind == 0 || at.kind == ANPOS_ANNOTEXT);
-    for (const Entry &e : before) plain &= e.record.start.kind == 0 || e.record.start.kind == 5;
+    for (const Entry &e : before)  // nor where both of two sibling anchors have text (left open)
+        plain &= (e.record.start.kind == 0 || e.record.start.kind == 5) &&
+                 !(IsText(e) && Siblings(e.record.start, at));
     if ((type == AN_TYPE_TEXT || type == AN_TYPE_PLACEHOLDER) && plain) {
         std::u16string expected = AnchorText(before, at);
         const size_t k = at.kind == ANPOS_ANNOTEXT ? at.textIndex : expected.size();
