@@ -119,6 +119,8 @@ void Check(const char *row) {
     for (s = part[4]; More(s);) removed.push_back(Num(s));
     EXPECT_EQ(heard.second, removed);
 }
+#define X16 "xxxxxxxxxxxxxxxx"
+#define Y16 "yyyyyyyyyyyyyyyy"
 TEST_F(Store, SequencesLeaveTheirTable) {
     const char *const rows[] = {
         "TextGoesFirstRangesMergeOnlyRanges: 3|h3-5 t3'ab'/2 #3/3 r5-7/4|2 3 1@3-5 4|ab#",
@@ -156,9 +158,13 @@ TEST_F(Store, SequencesLeaveTheirTable) {
         "WalkGoesOnBehindReleased: 1|t1'ab' #1/2 t1'cd'/3 p2/2 p3/3 t5'z'/4 h5-5/5 p5/4 p6/6 e/2 "
         "e/4|1 3 6|abcd|2 2 4 4",
         "SelectedTextNotJoined: 1|t1'ab' #1/2 t1'cd'/2 p:3/3 e/2|1@1 3@1|ab|2 2",
-        "JoinOutOfMemoryGives13: 1|t1'xxxxxxxxxxxxxxxxxxxxxxxxxxxxxxxxxxxxxxxx' #1/2 "
-        "t1'yyyyyyyyyyyyyyyyyyyyyyyyyyyyyy'/3 p:45/4 N F e/2!13|1@:40 4@:44 "
-        "3@1|xxxxxxxxxxxxxxxxxxxxxxxxxxxxxxxxxxxxxxxxyyyyyyyyyyyyyyyyyyyyyyyyyyyyyy",
+        // Texts of 64 units and more: the buffer grows, and stays as it was when it cannot.
+        "JoinOutOfMemoryGives13: 1|t1'" X16 X16 "xxxxxxxx' #1/2 t1'" Y16
+        "yyyyyyyy'/3 p:45/4 N F "
+        "e/2!13|1@:40 4@:44 3@1|" X16 X16 "xxxxxxxx" Y16 "yyyyyyyy",
+        "TextGrowsInPlace: 2|t2'" X16 X16 X16
+        "xxxxxxxxxxxxxxx' t3'z'/2 F t2'yy'!13 F t:5'ab'!13 "
+        "t2'yy' t:5'ab'|1 2|xxxxxab" X16 X16 "xxxxxxxxxxxxxxxxxxxxxxxxxxyy",
         "EntryMovedBehindTheWalk: T1.0|h1:1-1/7 S #1.0/7 v1.0/3 t1.0''/2 K x0/0|||7 7 2 3",
         // Flags 0 spare bit 31; 0x2000 (tag == value) wins over 0x1000 (tag has value's bits).
         "SelectionByFlagsAndTag: 1|p0/2 p1/4 p2/6 p3/7 p4/0x80000007 p5/0x80000006 p6/14 x1/7 "
