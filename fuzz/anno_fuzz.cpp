@@ -524,9 +524,9 @@ void Run::CheckAdded(Document &d, uint16_t type, const ANPos &at, const std::vec
     const std::vector<Entry> after = ListEntries(d.handle);
     // Not at a kind of the caller's own, nor where copying mixed texts at one anchor, ...
     bool plain = !d.mixedText && (at.kind == 0 || at.kind == ANPOS_ANNOTEXT);
-    for (const Entry &e : before)  // nor where both of two sibling anchors have text (left open)
+    for (const Entry &e : before)  // nor beside a sibling anchor with annotations (left open)
         plain &= (e.record.start.kind == 0 || e.record.start.kind == 5) &&
-                 !(IsText(e) && Siblings(e.record.start, at));
+                 !Siblings(e.record.start, at);
     if ((type == AN_TYPE_TEXT || type == AN_TYPE_PLACEHOLDER) && plain) {
         std::u16string expected = AnchorText(before, at);
         const size_t k = at.kind == ANPOS_ANNOTEXT ? at.textIndex : expected.size();
