@@ -439,7 +439,7 @@ void Run::Add(Document &d) {
     const ANPos start = PickPos(in_, d);
     const ANPos end = PickPos(in_, d);
     uint64_t userData = in_.chance(128) ? in_.u32() : 0;
-    std::vector<uint16_t> text(in_.below(6));
+    std::vector<uint16_t> text(in_.chance(12) ? 56 + in_.below(16) : in_.below(6));  // buffers grow
     for (uint16_t &u : text) u = static_cast<uint16_t>('A' + in_.below(26));
     // A null text pointer is refused unless the text is empty.
     const uint16_t *textPointer = in_.chance(text.empty() ? 128 : 4) ? nullptr : text.data();
@@ -525,8 +525,8 @@ void Run::CheckAdded(Document &d, uint16_t type, const ANPos &at, const std::vec
     // Not at a kind of the caller's own, nor where copying mixed texts at one anchor, ...
     bool plain = !d.mixedText && (at.kind == 0 || at.kind == ANPOS_ANNOTEXT);
     for (const Entry &e : before)  // nor beside a sibling anchor with annotations (left open)
-        plain &= (e.record.start.kind == 0 || e.record.start.kind == 5) &&
-                 !Siblings(e.record.start, at);
+        plain &=
+            (e.record.start.kind == 0 || e.record.start.kind == 5) && !Siblings(e.record.start, at);
     if ((type == AN_TYPE_TEXT || type == AN_TYPE_PLACEHOLDER) && plain) {
         std::u16string expected = AnchorText(before, at);
         const size_t k = at.kind == ANPOS_ANNOTEXT ? at.textIndex : expected.size();
