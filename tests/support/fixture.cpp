@@ -40,33 +40,17 @@ DAHandle PlainDocument(uint32_t count) {
     return builder.build();
 }
 
-namespace {
-
-uint32_t AddFullRecord(DAHandle doc, uint16_t type, const ANPos &start, const ANPos &end,
-                       uint32_t tag, uint32_t style, uint64_t userData, uint32_t eventMask,
-                       uint64_t value) {
-    ANAnnoRecord d{};
-    d.size = AN_RECORD_SIZE_POINT;
-    d.tag = tag;
-    d.start = start;
-    d.end = end;
-    d.eventMask = eventMask;
-    d.userData = userData;
-    d.value = value;
-    d.style = style;
-    return ANAddAnno(doc, type, &d);
-}
-
-}  // namespace
-
 uint32_t AddHilite(DAHandle doc, const ANPos &start, const ANPos &end, uint32_t tag, uint32_t style,
                    uint64_t userData, uint32_t eventMask, uint64_t value) {
-    return AddFullRecord(doc, AN_TYPE_HILITE, start, end, tag, style, userData, eventMask, value);
+    ANAnnoRecord d{72, tag, start, end, eventMask, 0, userData, value, {}, 0, 0, nullptr, 0, 0};
+    d.style = style;
+    return ANAddAnno(doc, AN_TYPE_HILITE, &d);
 }
 
 uint32_t AddPoint(DAHandle doc, const ANPos &pos, uint32_t tag, uint64_t value, uint16_t type,
                   uint32_t eventMask, uint64_t userData) {
-    return AddFullRecord(doc, type, pos, pos, tag, 0, userData, eventMask, value);
+    const ANAnnoRecord d{72, tag, pos, pos, eventMask, 0, userData, value, {}, 0, 0, nullptr, 0, 0};
+    return ANAddAnno(doc, type, &d);
 }
 
 uint32_t AddRange(DAHandle doc, const ANPos &start, const ANPos &end, uint32_t tag,
@@ -77,13 +61,8 @@ uint32_t AddRange(DAHandle doc, const ANPos &start, const ANPos &end, uint32_t t
 
 uint32_t AddText(DAHandle doc, const ANPos &pos, std::u16string_view text, uint32_t tag,
                  uint64_t userData) {
-    const ANTextDesc d{sizeof(ANTextDesc),
-                       tag,
-                       pos,
-                       userData,
-                       reinterpret_cast<const uint16_t *>(text.data()),
-                       static_cast<uint32_t>(text.size()),
-                       0};
+    const auto *units = reinterpret_cast<const uint16_t *>(text.data());
+    const ANTextDesc d{sizeof(ANTextDesc), tag, pos, userData, units, uint32_t(text.size()), 0};
     return ANAddAnno(doc, AN_TYPE_TEXT, &d);
 }
 
