@@ -155,9 +155,24 @@ Str Walk(DAHandle doc, const char *q, char step) {
 }
 // "m 6 8": ordinals to positions ("9.9": not written), "M" also with the content seeks so far;
 // "o 3.6": positions to ordinals; "!" and the code on failure, "?" when the record changed.
+// "l 5" maps as "m" after a log of the reads: each one's room, "+" and the bytes moved over since
+// the one before (0, ~ where the module scribbled). "l3 5": each read tells lie 3: written room + 1
+// (1) or ~0 (2), charCount ~0 (3), 0x7FFFFFFF wide not taken (4), charCount 0 and written 7 (5).
 Str Mapped(DAHandle doc, const char *q, char k) {
-    Str s;
+    Str s, log;
     if (k == 'M') antk::resetCalls();
+    const int lie = k == 'l' && *q != ' ' ? *q++ - '0' : 0;
+    const unsigned char *last = nullptr;
+    if (k == 'l')
+        HookContentReads([&](ContentPiece &p) {
+            for (log += last && last != p.buffer ? " +" : ""; last && last != p.buffer; ++last)
+                log += *last == 0 ? '0' : *last == 0xAA ? '~' : char(*last);
+            Put(log, to_string(p.room)), last = p.buffer;
+            if (p.written < p.room) std::memset(p.buffer + p.written, 0xAA, p.room - p.written);
+            p.written = lie == 1 ? p.room + 1 : lie == 2 ? ~0u : lie == 5 ? 7 : p.written;
+            p.charCount = lie == 3 ? ~0u : lie == 4 ? 0x7FFFFFFF : lie == 5 ? 0 : p.charCount;
+            if (lie == 4) p.flags |= 0x10000, p.charSet = antk::kCharSetWide;
+        });
     for (const char *at = q; *at != 0;) {
         const ANPos p = ParsePos(at);
         ANMapRecord m{28, k == 'o' ? 2u : 1u, k == 'o' ? p : Pos(9, 9), k == 'o' ? 999 : p.itemId};
@@ -167,7 +182,8 @@ Str Mapped(DAHandle doc, const char *q, char k) {
         Put(s, rc == AN_OK ? got : bad + (std::memcmp(&m, &before, 28) ? "?" : ""));
         if (k == 'M') s += Str("/") + to_string(antk::calls(Fn::CASeek));
     }
-    return s;
+    HookContentReads({});
+    return k == 'l' ? log + " = " + s : s;
 }
 // Rows: layout|annotations first|query|expected|a call failing ("CHGetItem 1", "s": for good).
 // Layout "" is no document. Global styles: 11 (in 24 bytes), 20-24 (flags 0 1 2 4 ~7).
@@ -259,6 +275,12 @@ TEST_F(ReadCases, Rows) {
         map + "m 6 6 8|!25 3.6 65536.65537|CHGetItemId 1", map + "o 131072.131073|12|CAReadNext 1",
         map + "m 6 6 8|!18 !25 9.9|DAOpenDocument 1", map + "m 6 6 8|!18 !25 9.9|CAOpenContent 1",
         map + "o 3.6|!15|CHGetItemCountById 1", map + "o 3.6|!25|CHGetRunFromItemId 1",
+        // Reading: lock 3 is the cached map's; hidden text is moved over as 0s, wide text by 2s.
+        map + (ANNO_HAVE_PLATFORM_CONTROLS ? "o 3.6|!15|GlobalLock 3" : "o 3.6|6"),
+        "adf@1 10000 0||l 5|12 +abc 9 9 +00 7 7 +f 6 = 2.5", "ad||l1 2 3|10 = 0.2 !25",
+        "adf@1 0 10||l 5|12 +a0b0c0 6 +0000 2 +f0 0 = 2.5", "ad||l2 2 3|10 = 0.2 !25",
+        "ad||l3 4 5|10 +abc 7 +de 5 = 0.4 !25", "ad||l4 4 5|10 = 0.4 !25",
+        "ad||l5 0|10 +abc~~~~ 3 +de~ 0 = 9.9",
     };
     // clang-format on
     for (const Str &row : rows) {
@@ -267,15 +289,21 @@ TEST_F(ReadCases, Rows) {
         f.resize(5);
         SCOPED_TRACE(row);
         Doc doc(f[0].empty() ? nullptr : Made(f[0], f[1], global));
+#if ANNO_HAVE_PLATFORM_CONTROLS
+        if (f[4].rfind("GlobalLock", 0) == 0) anwin::failGlobalLock(std::atoi(&f[4][10]));
+#endif
         for (int fn = 0; !f[4].empty() && fn < static_cast<int>(Fn::Count); ++fn)
             if (f[4].rfind(antk::fnName(Fn(fn)) + Str(" "), 0) == 0)
                 antk::failCall(Fn(fn), std::atoi(&f[4][f[4].find(' ')]), 55, f[4].back() == 's');
         const char k = f[2][0], *q = f[2].c_str() + 1;
-        const Str got = k == 'r'                           ? Split(doc, q)
-                        : k == 'k' || k == 'K' || k == 'j' ? Tracked(doc, q, k)
-                        : k == 'm' || k == 'o' || k == 'M' ? Mapped(doc, q, k)
-                                                           : Walk(doc, q, k);
+        const Str got = k == 'r'                                       ? Split(doc, q)
+                        : k == 'k' || k == 'K' || k == 'j'             ? Tracked(doc, q, k)
+                        : k == 'm' || k == 'o' || k == 'M' || k == 'l' ? Mapped(doc, q, k)
+                                                                       : Walk(doc, q, k);
         antk::clearFailures();
+#if ANNO_HAVE_PLATFORM_CONTROLS
+        EXPECT_EQ(anwin::globalLocks(), 0);  // nothing is left locked between calls
+#endif
         EXPECT_EQ(got, f[3]);
     }
     ANDeInitGlobalHiliteStyles(global);

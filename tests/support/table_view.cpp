@@ -5,6 +5,7 @@
 
 #include "anno/toolkit.h"
 #include "binding/instance.h"
+#include "hosts/modules.h"
 #include "hosts/platform.h"
 #include "store/table.h"
 
@@ -150,6 +151,15 @@ std::string PosText(const ANPos &pos) {
     char out[64];
     std::snprintf(out, sizeof out, "(%u, %s, %u, %u)", pos.itemId, sub, pos.kind, pos.textIndex);
     return out;
+}
+
+void HookContentReads(const std::function<void(ContentPiece &)> &edit) {
+    if (!edit) return antk::setContentReadHook(nullptr);
+    antk::setContentReadHook([edit](CAReadRecord *r) {
+        auto *buffer = static_cast<unsigned char *>(r->buffer);
+        ContentPiece p{r->type, r->flags, r->room, r->charCount, r->charSet, r->written, buffer};
+        edit(p);
+    });
 }
 
 }  // namespace annotest

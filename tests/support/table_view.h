@@ -6,6 +6,7 @@
 
 #include <cstddef>
 #include <cstdint>
+#include <functional>
 #include <string>
 #include <vector>
 
@@ -45,6 +46,11 @@ std::u16string AnchorText(const std::vector<Entry> &list, const ANPos &anchor,
 uint64_t NewHeapBlock(size_t bytes);
 void FreeHeapBlock(uint64_t block);
 std::string PosText(const ANPos &pos);  // (item, sub or -, kind, index)
+struct ContentPiece {  // a content read's fields, room and buffer as handed: edit them to lie
+    uint32_t &type, &flags, &room, &charCount, &charSet, &written;
+    unsigned char *buffer;
+};
+void HookContentReads(const std::function<void(ContentPiece &)> &edit);  // empty: unhooks
 
 }  // namespace annotest
 
