@@ -76,26 +76,27 @@ uint16_t ANFindWalking(const ANEntryTable *table, const ANFindRecord &find, uint
 // The first position of the text of a type-5 or type-6 entry: its start less its
 // units inside the text, or, for the last text at its anchor (whose start is the
 // anchor's content position), the units at the anchor counted by walking them.
-ANPos ANTextEntryStart(DAHandle doc, const ANEntry &entry) {
+// A failure to read the document on the way is returned, and `first` is not written.
+uint32_t ANTextEntryStart(DAHandle doc, const ANEntry &entry, ANPos *first) {
     const ANPos &start = entry.record.start;
     const uint32_t units = entry.type == AN_TYPE_TEXT ? entry.record.textLength : 1;
-    ANPos first = start;
-    first.kind = ANPOS_ANNOTEXT;
-    if (start.kind == ANPOS_ANNOTEXT) {
-        first.textIndex = start.textIndex - units;
-        return first;
-    }
+    *first = ANPos{start.itemId, start.subItemId, ANPOS_ANNOTEXT, start.textIndex - units};
+    if (start.kind == ANPOS_ANNOTEXT) return AN_OK;
     ANPos at{start.itemId, start.subItemId, ANPOS_ANNOTEXT, 0};
     uint32_t steps = 0;
     for (;;) {
+        // Only the text step moves within the anchor's text; where it gives nothing
+        // more there, the walk would go on to the anchor's content. A failure to find
+        // the state on the way would cut the count short, so it is returned instead.
         ANPos following{};
-        const uint32_t rc = ANNextPos(doc, &at, &following);
+        const uint32_t rc = ANNextAnnoTextPos(doc, &at, &following);
         ++steps;
-        if (rc != AN_OK || following.kind != ANPOS_ANNOTEXT || !ANSameAnchor(following, at)) break;
+        if (rc != AN_OK && rc != AN_ERR_NOTFOUND) return rc;
+        if (rc != AN_OK || !ANSameAnchor(following, at) || !ANPosBefore(at, following)) break;
         at = following;
     }
-    first.textIndex = steps - units;
-    return first;
+    first->textIndex = steps - units;
+    return AN_OK;
 }
 
 }  // namespace
@@ -120,7 +121,10 @@ extern "C" AN_API uint32_t ANFindAnno(DAHandle doc, uint16_t flags, ANFindRecord
 
     const ANEntry &entry = ANSlot(table, found);
     if (entry.type == AN_TYPE_TEXT || entry.type == AN_TYPE_PLACEHOLDER) {
-        find->foundStart = ANTextEntryStart(doc, entry);
+        ANPos first{};
+        const uint32_t failed = ANTextEntryStart(doc, entry, &first);
+        if (failed != AN_OK) return failed;
+        find->foundStart = first;
         find->foundEnd = entry.record.start;
     } else {
         find->foundStart = entry.record.start;
