@@ -105,6 +105,7 @@ TEST_F(Hostile, EveryExportAnswersHostileArgumentsAsDocumented) {
         ROW(25, 25, kWrote, kWrote, Kept(ANPos{}, ANNextPos, d, &r.at)),
         ROW(15, 18, 15, 15, All({ANMapPosition(d, nullptr), ANAddHiliteStyle(d, nullptr)})),
         ROW(15, 18, 13, 13, All({ANAddAnno(d, 5, &huge), ANAddAnno(d, 5, &on6)})),
+        ROW(15, 15, 15, 15, FOR(0, 12, ANAddAnno(d, uint16_t(v < 4 ? v * 8 : ~v), &point))),
         ROW(15, 18, 25, 25, All({ANNextChunkerPos(d, &r.past, &r.to), ANNextAnnoTextPos(d, &r.past,
             &r.to), Kept(ANMapRecord{ANMAPRECORD_SIZE, 1, {}, 0}, ANMapPosition, d)})),
         ROW(15, X, X, X, All({ANInitGlobalHiliteStyles(nullptr),
