@@ -417,7 +417,8 @@ AN_API uint32_t ANStartAnnoTrack(DAHandle doc, const ANPos *start, ANTrackInfo *
 AN_API uint32_t ANEndAnnoTrack(DAHandle doc, ANTrackInfo *track);
 
 /* Reports what changes at `pos`, visited in ascending order, as ANTRACK_BIT_* bits,
- * with the details in *track. 0 before track->nextChange. Allocates nothing. */
+ * with the details in *track. 0 before track->nextChange, and 0 for a null document,
+ * position or record. Allocates nothing. */
 AN_API uint32_t ANTrackAnno(DAHandle doc, const ANPos *pos, ANTrackInfo *track);
 
 /* Prepares an annotation text track (one allocation). Returns 0, 13 (the record is

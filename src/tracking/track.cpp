@@ -132,7 +132,7 @@ extern "C" AN_API uint32_t ANStartAnnoTrack(DAHandle doc, const ANPos *start, AN
 extern "C" AN_API uint32_t ANEndAnnoTrack(DAHandle, ANTrackInfo *) { return 0; }
 
 extern "C" AN_API uint32_t ANTrackAnno(DAHandle doc, const ANPos *pos, ANTrackInfo *track) {
-    if (doc == nullptr) return 0;
+    if (doc == nullptr || pos == nullptr || track == nullptr) return 0;
     // Only whether a state came back counts, not what the lookup reported.
     void *state = nullptr;
     DAGetAnno(doc, &state);
