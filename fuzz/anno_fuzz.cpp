@@ -589,6 +589,7 @@ void Run::ClearUserData(Document &d) {
         std::set<uint64_t> blocks;
         for (const Entry &e : ListEntries(d.handle))
             if (e.ownsUserData && e.record.userData != 0) blocks.insert(e.record.userData);
+        for (const uint64_t block : annotest::KeptBlocks(d.handle)) blocks.insert(block);
         return blocks;
     };
     const std::set<uint64_t> before = owned();

@@ -40,6 +40,7 @@ void ANFreeInstance(ANInstance *instance) {
     ANFreeStyleTable(instance->styles);
     instance->styles = nullptr;
     ANCloseContent(instance);
+    ANHeapFree(instance->orphans);  // the blocks themselves only ANClearUserData frees
     ANHeapFree(instance);
 }
 

@@ -39,6 +39,10 @@ struct ANInstance {
     DAHandle contentDoc;     // second document opened for content reading
     CAHandle content;        // content handle on contentDoc
     uint32_t contentFailed;  // bit 0: opening the content failed once
+    // Blocks callers handed over (userData of types 1, 3, 5) whose annotations merged
+    // into others or went unannounced; ANClearUserData frees them with the entries'.
+    uint64_t *orphans;
+    uint32_t orphanCount, orphanCapacity;
 };
 
 constexpr uint32_t ANCONTENT_FAILED = 0x1;

@@ -56,11 +56,22 @@ void ANGiveBack(ANClearWalk &walk, uint16_t index) {
     if (walk.instance->hoverEntry == index) ANResetHover(walk.instance);
 }
 
+bool ANOwnsUserData(const ANEntry &entry) {
+    const bool blockType =
+        entry.type == AN_TYPE_HILITE || entry.type == AN_TYPE_RANGE || entry.type == AN_TYPE_TEXT;
+    return blockType && (entry.flags & ANENTRY_OWNS_USERDATA) != 0 && entry.record.userData != 0;
+}
+
 // Releases an entry that a removal takes with it, without telling the callback.
 void ANDropEntry(ANClearWalk &walk, uint16_t index) {
     ANEntry &entry = ANSlot(walk.table, index);
     if (walk.cursor == index) walk.cursor = entry.next;
     ANListRemove(walk.table, index);
+    // Nobody hears of this entry again: the document keeps its block.
+    if (ANOwnsUserData(entry)) {
+        entry.flags = static_cast<uint16_t>(entry.flags & ~ANENTRY_OWNS_USERDATA);
+        ANKeepOrphanBlock(walk.instance, entry.record.userData);
+    }
     if (entry.type == AN_TYPE_TEXT) {
         ANHeapFree(entry.record.textBuffer);
         entry.record.textBuffer = nullptr;
@@ -247,12 +258,6 @@ uint32_t ANRemoveEntry(ANClearWalk &walk, uint16_t index, uint32_t status) {
     return status;
 }
 
-bool ANOwnsUserData(const ANEntry &entry) {
-    const bool blockType =
-        entry.type == AN_TYPE_HILITE || entry.type == AN_TYPE_RANGE || entry.type == AN_TYPE_TEXT;
-    return blockType && (entry.flags & ANENTRY_OWNS_USERDATA) != 0 && entry.record.userData != 0;
-}
-
 // Frees every userData block an entry was given to own, once per block: later entries
 // holding the same value lose it before it is freed.
 void ANFreeUserDataBlocks(ANEntryTable *table) {
@@ -318,7 +323,8 @@ extern "C" AN_API uint32_t ANClearUserData(DAHandle doc) {
     void **slots = lock.slots();
     if (slots == nullptr) return AN_OK;
     auto *instance = static_cast<ANInstance *>(slots[ANMOD_SLOT_ANNO]);
-    if (instance == nullptr || instance->entries == nullptr) return AN_OK;
-    ANFreeUserDataBlocks(instance->entries);
+    if (instance == nullptr) return AN_OK;
+    ANFreeOrphanBlocks(instance);  // first: those an entry owns go with the entries'
+    if (instance->entries != nullptr) ANFreeUserDataBlocks(instance->entries);
     return AN_OK;
 }

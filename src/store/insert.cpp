@@ -394,7 +394,13 @@ uint32_t InsertIntoTable(ANInstance *instance, uint16_t type, ANAnnoRecord *reco
     }
     uint16_t next = prev == AN_NONE ? table->first : ANSlot(table, prev).next;
 
-    if (type == AN_TYPE_RANGE && MergeRange(instance, prev, next, *record)) return AN_OK;
+    // A record that merges into an entry leaves its block (if the caller handed one
+    // over) without a holder; the document keeps it for ANClearUserData.
+    const uint64_t block = (flags & ANENTRY_OWNS_USERDATA) != 0 ? record->userData : 0;
+    if (type == AN_TYPE_RANGE && MergeRange(instance, prev, next, *record)) {
+        ANKeepOrphanBlock(instance, block);
+        return AN_OK;
+    }
     if (!IsText(type)) return LinkNewEntry(instance, prev, type, *record, flags, nullptr);
 
     // Annotation text goes before the other annotations that start where it does.
@@ -425,7 +431,10 @@ uint32_t InsertIntoTable(ANInstance *instance, uint16_t type, ANAnnoRecord *reco
     } else {
         bool stored = false;
         rc = StoreText(table, record, around, &stored);
-        if (rc == AN_OK && stored) return AN_OK;
+        if (rc == AN_OK && stored) {
+            ANKeepOrphanBlock(instance, block);
+            return AN_OK;
+        }
     }
     if (rc != AN_OK) return rc;
     return LinkNewEntry(instance, prev, type, *record, flags, nullptr);

@@ -1,9 +1,11 @@
-// Making and growing the annotation table, taking and giving back slots, and
-// moving entries within the ordered list.
+// Making and growing the annotation table, taking and giving back slots, moving
+// entries within the ordered list, and the caller blocks no entry holds any more.
 #include "hosts/heap.h"
 #include "store/store.h"
 
 namespace {
+
+constexpr uint32_t kOrphanGrowth = 8;  // kept blocks, in records of 8 bytes
 
 // Links slots [from, to) into a free-list chain in increasing order, hanging it
 // after `tail` (AN_NONE: the chain is the whole free list).
@@ -137,4 +139,34 @@ void ANRestoreOrder(ANEntryTable *table, const ANPos &anchor, uint16_t from) {
         }
         current = following;
     }
+}
+
+void ANKeepOrphanBlock(ANInstance *instance, uint64_t block) {
+    if (block == 0) return;
+    if (instance->orphanCount == instance->orphanCapacity) {
+        const uint32_t capacity = instance->orphanCapacity + kOrphanGrowth;
+        const size_t bytes = sizeof(uint64_t) * capacity;
+        void *grown = instance->orphans == nullptr ? ANHeapAlloc(bytes)
+                                                   : ANHeapReAlloc(instance->orphans, bytes);
+        if (grown == nullptr) return;
+        instance->orphans = static_cast<uint64_t *>(grown);
+        instance->orphanCapacity = capacity;
+    }
+    instance->orphans[instance->orphanCount++] = block;
+}
+
+void ANFreeOrphanBlocks(ANInstance *instance) {
+    const ANEntryTable *table = instance->entries;
+    for (uint32_t k = 0; k < instance->orphanCount; ++k) {
+        const uint64_t block = instance->orphans[k];
+        bool held = false;
+        for (uint32_t j = 0; j < k && !held; ++j) held = instance->orphans[j] == block;
+        for (uint16_t i = table != nullptr ? table->first : AN_NONE; i != AN_NONE && !held;
+             i = ANSlot(table, i).next) {
+            const ANEntry &entry = ANSlot(table, i);
+            held = (entry.flags & ANENTRY_OWNS_USERDATA) != 0 && entry.record.userData == block;
+        }
+        if (!held) ANHeapFree(reinterpret_cast<void *>(static_cast<uintptr_t>(block)));
+    }
+    instance->orphanCount = 0;
 }

@@ -54,6 +54,15 @@ uint32_t ANAddRecord(DAHandle doc, uint16_t type, ANAnnoRecord *record, uint32_t
 
 // ---- Table and slot helpers, shared with clearing --------------------------------
 
+// Keeps a block a caller handed over (userData of types 1, 3, 5; 0: none) whose
+// annotation merged into another or went unannounced, for ANClearUserData to free.
+// Out of memory the block is not kept: never freed rather than freed too soon.
+void ANKeepOrphanBlock(ANInstance *instance, uint64_t block);
+
+// Frees the kept blocks, each once, except those an entry owns (freed with the
+// entries' blocks), and forgets them.
+void ANFreeOrphanBlocks(ANInstance *instance);
+
 // A new table block of ANTABLE_GROWTH slots, all on the free list in increasing
 // order, no entries, `full` and `hasText` 0. Null when out of memory.
 ANEntryTable *ANMakeTable();

@@ -357,6 +357,25 @@ TEST_F(Store, BindingMakesFindsAndDropsTheState) {
     EXPECT_EQ(ANDeInit(doc), 55u);
     EXPECT_EQ(ListEntries(doc).size(), 1u) << "a failed de-init keeps the state";
 }
+// A caller's block whose annotation merges into another (touching ranges, text appended) or
+// goes unannounced (texts joined round a cleared placeholder, a range emptied with its text) is
+// freed, unless another annotation still owns it; the fixture counts the heap's blocks.
+TEST_F(Store, BlocksOfAnnotationsThatMergeOrGoUnannouncedAreFreed) {
+    Doc doc(PlainDocument(20));
+    const uint64_t shared = NewHeapBlock(8);
+    auto b = [] { return NewHeapBlock(8); };
+    const ANPos t1 = TextPos(9, kNo, 1), t2 = TextPos(9, kNo, 2);
+    for (const uint32_t rc :
+         {Init(doc), AddRange(doc, Pos(1), Pos(3), 1, b()), AddRange(doc, Pos(3), Pos(5), 1, b()),
+          AddHilite(doc, Pos(6), Pos(8), 1, 0, shared), AddRange(doc, Pos(5), Pos(6), 1, shared),
+          AddText(doc, Pos(7), u"ab", 1, b()), AddText(doc, Pos(7), u"cd", 1, b()),
+          AddMark(doc, 6, Pos(7), 2), AddText(doc, Pos(7), u"ef", 3, b()),
+          AddText(doc, Pos(9), u"xyz", 4), AddRange(doc, t1, t2, 5, b()),
+          ANClearAnnos(doc, ANCLEAR_EQUAL, 2), ANClearAnnos(doc, ANCLEAR_EQUAL, 4)})
+        EXPECT_EQ(rc, AN_OK);
+    EXPECT_EQ(ListEntries(doc).size(), 3u);
+    EXPECT_EQ(ANClearUserData(doc), AN_OK);
+}
 TEST_F(Store, FullTableRefusesWith13) {
 #if defined(__SANITIZE_ADDRESS__)
     GTEST_SKIP() << "65529 entries: too slow with the address sanitizer's allocator";

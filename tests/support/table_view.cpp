@@ -99,6 +99,12 @@ std::vector<Entry> ListEntries(DAHandle doc) {
 
 bool HasTable(DAHandle doc) { return TableOf(doc) != nullptr; }
 
+std::vector<uint64_t> KeptBlocks(DAHandle doc) {
+    const ANInstance *in = InstanceOf(doc);
+    return in ? std::vector<uint64_t>(in->orphans, in->orphans + in->orphanCount)
+              : std::vector<uint64_t>{};
+}
+
 std::vector<uint8_t> TableBytes(DAHandle doc) {
     const ANEntryTable *table = TableOf(doc);
     if (table == nullptr) return {};

@@ -22,11 +22,12 @@ struct Entry {  // one entry of the ordered list; `slot` is its number in tracki
     std::u16string text;  // type 5: its units
 };
 
-std::vector<Entry> ListEntries(DAHandle doc);   // first to last; empty without a table
-bool HasTable(DAHandle doc);                    // a clear that empties the table frees it
-std::vector<uint8_t> TableBytes(DAHandle doc);  // what read-only calls must keep
-uint16_t HoverEntry(DAHandle doc, ANPos *pos);  // the last move event's entry and position
-uint32_t BuildCursor(DAHandle doc);             // the next range ANBuildAnnos examines
+std::vector<Entry> ListEntries(DAHandle doc);    // first to last; empty without a table
+bool HasTable(DAHandle doc);                     // a clear that empties the table frees it
+std::vector<uint8_t> TableBytes(DAHandle doc);   // what read-only calls must keep
+uint16_t HoverEntry(DAHandle doc, ANPos *pos);   // the last move event's entry and position
+uint32_t BuildCursor(DAHandle doc);              // the next range ANBuildAnnos examines
+std::vector<uint64_t> KeptBlocks(DAHandle doc);  // held for ANClearUserData, of no entry
 
 // The rules every operation keeps: both lists of the table consistent and together
 // covering every slot once; count the ordered list's length; at least one free slot;
