@@ -490,6 +490,10 @@ void Run::Add(Document &d) {
     }
     if (rc == 0 && Bound(d))  // also when a failure was armed: an add that succeeds is whole
         CheckAdded(d, type, start, before, text, d.callback ? &notes[0].record : nullptr);
+    const bool shifts =
+        type == AN_TYPE_RANGE || type == AN_TYPE_TEXT || type == AN_TYPE_PLACEHOLDER;
+    CHECK(rc == 0 || shifts || SameListing(before, ListEntries(d.handle)),  // text: left open
+          "an add that failed with " + N(rc) + " changed the table");
     if (Unheld(d, rc == AN_ERR_NOSTATE || rc == AN_ERR_BADARG, rc)) return;
     const bool nullText = type == AN_TYPE_TEXT && textPointer == nullptr && !text.empty();
     CHECK(rc == AN_ERR_BADARG || (rc == 0 && !nullText), "adding gave " + N(rc));

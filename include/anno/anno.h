@@ -293,13 +293,13 @@ AN_API uint32_t ANSetCallback(DAHandle doc, ANCallback callback, void *callbackD
  * the document's items and cut into pieces with cut markers. On success the
  * callback hears notification 1 once, with the normalised record.
  * A type-1, 3 or 5 annotation with a non-zero userData hands that block over:
- * ANClearUserData may free it.
+ * ANClearUserData frees it, also when the annotation has merged into another.
  * Returns 15 (bad type, null descriptor, size not accepted, null doc, a type-5 text
  * of non-zero length at a null pointer, or a type-5/6 position inside annotation
  * text that its anchor does not have: nothing added), a DAGetAnno failure, 18 (no
- * state), 13 (out of memory or the table is full: the entry may nevertheless be
- * stored; no notification), for type 3 a failure of fitting it (the pieces stored
- * before stay), otherwise 0. */
+ * state), 13 (out of memory or the table is full: not stored, no notification),
+ * for type 3 a failure of fitting it (the pieces stored before stay), otherwise 0.
+ * The add that takes the table's last place succeeds; the next one gets 13. */
 AN_API uint32_t ANAddAnno(DAHandle doc, uint16_t type, const void *descriptor);
 
 /* Removes the annotations of `doc` that `flags` and `value` select and announces

@@ -95,6 +95,17 @@ uint32_t LinkNewEntry(ANInstance *instance, uint16_t prev, uint16_t type,
     return AN_OK;
 }
 
+// Links the entry an insertion is for. Once it is in, a growth that fails (out of
+// memory, or the table at its limit, which sets `full`) leaves the last free slot,
+// and the next insertion grows first or is refused; 13 here would tell a caller
+// that an annotation it handed a block with was not taken.
+uint32_t LinkEntryFor(ANInstance *instance, uint16_t prev, uint16_t type,
+                      const ANAnnoRecord &record, uint16_t flags) {
+    const uint16_t before = instance->entries->count;
+    const uint32_t rc = LinkNewEntry(instance, prev, type, record, flags, nullptr);
+    return instance->entries->count != before ? AN_OK : rc;
+}
+
 // The first entry of a document: makes the table around it.
 uint32_t InsertFirst(ANInstance *instance, uint16_t type, ANAnnoRecord *record, uint16_t flags) {
     uint16_t *ownText = nullptr;
@@ -401,7 +412,7 @@ uint32_t InsertIntoTable(ANInstance *instance, uint16_t type, ANAnnoRecord *reco
         ANKeepOrphanBlock(instance, block);
         return AN_OK;
     }
-    if (!IsText(type)) return LinkNewEntry(instance, prev, type, *record, flags, nullptr);
+    if (!IsText(type)) return LinkEntryFor(instance, prev, type, *record, flags);
 
     // Annotation text goes before the other annotations that start where it does.
     while (prev != AN_NONE && !IsText(ANSlot(table, prev).type) &&
@@ -437,7 +448,7 @@ uint32_t InsertIntoTable(ANInstance *instance, uint16_t type, ANAnnoRecord *reco
         }
     }
     if (rc != AN_OK) return rc;
-    return LinkNewEntry(instance, prev, type, *record, flags, nullptr);
+    return LinkEntryFor(instance, prev, type, *record, flags);
 }
 
 }  // namespace

@@ -36,9 +36,9 @@ constexpr uint32_t ANINSERT_COPY = 1;  // copying from another document: positio
 // and end. A new entry gets a copy of the record and `entryFlags` (ANENTRY_*).
 // Returns 0 (also when merged into an existing entry), 15 (null instance or record,
 // or a text position outside the annotation text at its anchor: nothing changed),
-// 13 (table full: nothing changed; out of memory: an entry linked before the failed
-// growth stays, a failed text allocation leaves texts as they were, and shifts
-// already made stay with the list kept in document order).
+// 13 (table full: nothing changed; out of memory: a failed text allocation leaves
+// texts as they were, and shifts already made stay with the list kept in document
+// order). Once the new entry is linked, a growth that fails does not fail the call.
 uint32_t ANInsertEntry(ANInstance *instance, uint16_t type, ANAnnoRecord *record, uint32_t mode,
                        uint16_t entryFlags);
 
