@@ -50,7 +50,8 @@ SlotIndex::SlotIndex(const std::vector<Entry> &list) {
 }
 
 bool SameListing(const std::vector<Entry> &a, const std::vector<Entry> &b) {
-    return std::equal(a.begin(), a.end(), b.begin(), b.end(), [](const Entry &x, const Entry &y) {
+    return std::equal(a.begin(), a.end(), b.begin(), b.end(), [](Entry x, Entry y) {
+        x.record.textBuffer = y.record.textBuffer, x.record.textCapacity = y.record.textCapacity;
         return x.slot == y.slot && x.type == y.type && x.text == y.text &&
                std::memcmp(&x.record, &y.record, sizeof(ANAnnoRecord)) == 0;
     });
@@ -490,10 +491,8 @@ void Run::Add(Document &d) {
     }
     if (rc == 0 && Bound(d))  // also when a failure was armed: an add that succeeds is whole
         CheckAdded(d, type, start, before, text, d.callback ? &notes[0].record : nullptr);
-    const bool shifts =
-        type == AN_TYPE_RANGE || type == AN_TYPE_TEXT || type == AN_TYPE_PLACEHOLDER;
-    CHECK(rc == 0 || shifts || SameListing(before, ListEntries(d.handle)),  // text: left open
-          "an add that failed with " + N(rc) + " changed the table");
+    CHECK(rc == 0 || type == AN_TYPE_RANGE || SameListing(before, ListEntries(d.handle)),
+          "an add that failed with " + N(rc) + " changed the table");  // a range keeps pieces
     if (Unheld(d, rc == AN_ERR_NOSTATE || rc == AN_ERR_BADARG, rc)) return;
     const bool nullText = type == AN_TYPE_TEXT && textPointer == nullptr && !text.empty();
     CHECK(rc == AN_ERR_BADARG || (rc == 0 && !nullText), "adding gave " + N(rc));

@@ -8,6 +8,7 @@
 // a placeholder inside a text splits it, and (when adding) the text positions of the
 // annotations behind the new units move up by its width.
 #include <cstring>
+#include <initializer_list>
 
 #include "hosts/heap.h"
 #include "store/index.h"
@@ -323,15 +324,10 @@ void ShiftTextPositions(ANInstance *instance, uint16_t type, ANAnnoRecord *recor
 // halves alike, and a userData block they then share is freed once, by S, which
 // comes first (ANClearUserData clears the same value in the entries after it).
 uint32_t SplitText(ANInstance *instance, uint16_t *prev, uint16_t following, uint32_t b,
-                   const ANAnnoRecord &record) {
+                   const ANAnnoRecord &record, uint16_t *buffer, uint32_t capacity) {
     const uint32_t k = record.start.textIndex - 1;
     const uint32_t m = k - b;
     ANEntry &x = ANSlot(instance->entries, following);
-    if (m > x.record.textLength) return AN_ERR_BADARG;  // kept out by TextIndexInside
-    uint32_t capacity = 0;
-    if (!CapacityFor(m, 0, &capacity)) return AN_ERR_NOMEM;
-    uint16_t *buffer = NewTextBuffer(capacity);
-    if (buffer == nullptr) return AN_ERR_NOMEM;
 
     ANAnnoRecord split = x.record;
     split.start = record.start;
@@ -358,37 +354,78 @@ uint32_t StoreText(ANEntryTable *table, ANAnnoRecord *record, const TextAround &
     const bool inText = record->start.kind == ANPOS_ANNOTEXT;
     // Where the new units begin in the anchor's text (start stands just after them).
     const uint64_t begin = static_cast<uint64_t>(record->start.textIndex) - width;
+    // The units were copied into the record's own buffer beforehand; text that goes
+    // into another entry is copied from there and the buffer given back.
+    const uint16_t *units = record->textBuffer;
+    auto giveBack = [record] {
+        ANHeapFree(record->textBuffer);
+        record->textBuffer = nullptr;
+        record->textCapacity = 0;
+    };
     *stored = true;
     if (around.mergeTarget != AN_NONE && (!inText || begin == around.before)) {
         ANAnnoRecord &target = ANSlot(table, around.mergeTarget).record;
-        const uint32_t rc = ReserveText(target, static_cast<uint64_t>(target.textLength) + width);
-        if (rc != AN_OK) return rc;
-        CopyUnits(target.textBuffer + target.textLength, record->text, width);
+        CopyUnits(target.textBuffer + target.textLength, units, width);  // room reserved
         target.textLength += width;
-        record->text = nullptr;
+        giveBack();
         return AN_OK;
     }
     if (around.following != AN_NONE) {
         ANAnnoRecord &target = ANSlot(table, around.following).record;
         if (record->start.textIndex < width || begin < around.before ||
             begin - around.before > target.textLength) {
+            giveBack();
             return AN_ERR_BADARG;
         }
         const auto offset = static_cast<uint32_t>(begin - around.before);
-        const uint32_t rc = ReserveText(target, static_cast<uint64_t>(target.textLength) + width);
-        if (rc != AN_OK) return rc;
         const uint32_t moved = target.textLength - offset;
         if (moved != 0 && width != 0) {
             std::memmove(target.textBuffer + offset + width, target.textBuffer + offset,
                          sizeof(uint16_t) * moved);
         }
-        CopyUnits(target.textBuffer + offset, record->text, width);
+        CopyUnits(target.textBuffer + offset, units, width);  // room reserved
         target.textLength += width;
-        record->text = nullptr;
+        giveBack();
         return AN_OK;
     }
     *stored = false;
-    return OwnTextCopy(record);
+    return AN_OK;
+}
+
+// The start index a placeholder's record has once shifting has moved it past itself.
+uint32_t SplitIndex(const ANAnnoRecord &record) {
+    const uint32_t k = record.start.textIndex;
+    return record.start.kind == ANPOS_ANNOTEXT ? ShiftedIndex(k, 1) : k;
+}
+
+// Makes, before any position moves, every allocation that storing the text or the
+// placeholder of `record` can need, so that running out of memory changes nothing:
+// room in the entries the text may go into, the record's own copy of its text, or
+// for a placeholder that splits a text, a free slot more and the split's buffer.
+uint32_t PrepareText(ANInstance *instance, uint16_t type, ANAnnoRecord *record,
+                     const TextAround &around, bool splits, uint16_t **splitBuffer,
+                     uint32_t *splitCapacity) {
+    if (type == AN_TYPE_TEXT) {
+        for (const uint16_t target : {around.mergeTarget, around.following}) {
+            if (target == AN_NONE) continue;
+            ANAnnoRecord &r = ANSlot(instance->entries, target).record;
+            const uint32_t rc = ReserveText(r, uint64_t{r.textLength} + record->textLength);
+            if (rc != AN_OK) return rc;
+        }
+        return OwnTextCopy(record);
+    }
+    if (!splits) return AN_OK;
+    const ANEntryTable *table = instance->entries;
+    if (table->count + 2u >= table->capacity) {
+        if (table->capacity + ANTABLE_GROWTH > ANTABLE_MAX_CAPACITY) return AN_ERR_NOMEM;
+        if (ANGrowTable(&instance->entries) != AN_OK) return AN_ERR_NOMEM;
+    }
+    const ANEntry &x = ANSlot(instance->entries, around.following);
+    const uint32_t m = SplitIndex(*record) - 1 - uint32_t(around.before);
+    if (m > x.record.textLength) return AN_ERR_BADARG;  // kept out by TextIndexInside
+    if (!CapacityFor(m, 0, splitCapacity)) return AN_ERR_NOMEM;
+    *splitBuffer = NewTextBuffer(*splitCapacity);
+    return *splitBuffer == nullptr ? AN_ERR_NOMEM : AN_OK;
 }
 
 // Inserting into a document that has a table: the place, then by type.
@@ -430,14 +467,22 @@ uint32_t InsertIntoTable(ANInstance *instance, uint16_t type, ANAnnoRecord *reco
         return AN_ERR_NOMEM;  // the anchor's text would outgrow its 32-bit indices
     }
     const auto before = static_cast<uint32_t>(around.before);
+    // A placeholder inside a text (by the index it will have past the shift) splits it.
+    const uint32_t at = SplitIndex(*record);
+    const bool splits = type == AN_TYPE_PLACEHOLDER && mode == ANINSERT_ADD &&
+                        around.following != AN_NONE && at > around.before + 1;
+    uint16_t *splitBuffer = nullptr;
+    uint32_t splitCapacity = 0;
+    uint32_t rc = PrepareText(instance, type, record, around, splits, &splitBuffer, &splitCapacity);
+    if (rc != AN_OK) return rc;
+    table = instance->entries;  // a growth may have moved it
     table->hasText = 1;
     if (mode == ANINSERT_ADD) ShiftTextPositions(instance, type, record, before, width);
 
-    uint32_t rc = AN_OK;
     if (type == AN_TYPE_PLACEHOLDER) {
-        if (mode == ANINSERT_ADD && around.following != AN_NONE &&
-            record->start.textIndex > around.before + 1) {
-            rc = SplitText(instance, &prev, around.following, before, *record);
+        if (splits) {
+            rc = SplitText(instance, &prev, around.following, before, *record, splitBuffer,
+                           splitCapacity);
         }
     } else {
         bool stored = false;
