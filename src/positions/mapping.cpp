@@ -22,6 +22,11 @@ constexpr size_t kMapEntryBytes = sizeof(uint32_t);
 constexpr size_t kScratchBytesPerChar = 2;  // room for the widest character set
 constexpr uint32_t kWideBytesPerChar = 2;
 constexpr uint32_t kLastSection = 0xFFFFFFFF;  // a chunker that never runs out is cut off here
+// A chunk has at most 65536 items (an item index has 16 bits), and the content module
+// reports each in at most three reads (span start, piece, span end) besides the reads
+// of its characters: a reader that goes on past that has met a module that never ends.
+constexpr uint64_t kMaxChunkItems = 0x10000;
+constexpr uint64_t kReadsPerItem = 3;
 
 constexpr ANCharMap kEmptyMap = {ANMAP_NO_CHUNK, nullptr, 0, 0};
 
@@ -91,15 +96,21 @@ uint32_t ANOpenContent(ANInstance *instance) {
 // Reads the content from the reader's place to its end and records, for each
 // character, the index of its item: at most `capacity` entries. Text goes to
 // `scratch` (`room` bytes); whatever the module reports, nothing is written outside
-// either buffer. Returns the number of characters recorded.
+// either buffer. Returns the number of characters recorded; *endless is set when the
+// module went on past what the chunk can hold without reporting the end.
 uint32_t ANReadPieces(ANInstance *instance, uint32_t *entries, uint32_t capacity,
-                      unsigned char *scratch, uint32_t room) {
+                      unsigned char *scratch, uint32_t room, bool *endless) {
     CAReadRecord read{};
     unsigned char *cursor = scratch;
     uint32_t recorded = 0;
     uint32_t oddPieces = 0;
     bool inHiddenSpan = false;
-    for (;;) {
+    const uint64_t maxReads = capacity + kMaxChunkItems * kReadsPerItem + 1;
+    for (uint64_t reads = 0;; ++reads) {
+        if (reads == maxReads) {
+            *endless = true;
+            break;
+        }
         read.size = sizeof(CAReadRecord);
         read.room = room;
         read.buffer = cursor;
@@ -131,7 +142,8 @@ uint32_t ANReadPieces(ANInstance *instance, uint32_t *entries, uint32_t capacity
 // Makes the map of `chunk` in `map` (which starts empty). Returns 0; 13 out of memory;
 // 15 a block that cannot be locked; 18 the content could not be opened (the map is
 // then kept without characters); 25 the chunker does not know where the chunk's
-// characters start. On a result other than 0 and 18, `map` has no block.
+// characters start, or the content module never reported the chunk's end. On a
+// result other than 0 and 18, `map` has no block.
 uint32_t ANReadCharMap(ANInstance *instance, uint16_t chunk, ANCharMap *map) {
     const uint32_t c0 = ANChunkStart(chunk);
     uint32_t base = 0;
@@ -171,12 +183,20 @@ uint32_t ANReadCharMap(ANInstance *instance, uint16_t chunk, ANCharMap *map) {
                 return AN_ERR_BADARG;
             }
         }
-        recorded =
-            ANReadPieces(instance, entries, entries == nullptr ? 0 : n, text,
-                         text == nullptr ? 0 : static_cast<uint32_t>(n * kScratchBytesPerChar));
+        bool endless = false;
+        recorded = ANReadPieces(
+            instance, entries, entries == nullptr ? 0 : n, text,
+            text == nullptr ? 0 : static_cast<uint32_t>(n * kScratchBytesPerChar), &endless);
         if (block != nullptr) {
             GlobalUnlock(scratch);
             GlobalUnlock(block);
+        }
+        if (endless) {  // no map from such a read: it is tried again next time
+            if (block != nullptr) {
+                GlobalFree(scratch);
+                GlobalFree(block);
+            }
+            return AN_ERR_NOTFOUND;
         }
     }
     if (block != nullptr) {

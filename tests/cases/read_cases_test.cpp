@@ -341,6 +341,16 @@ TEST_F(ReadCases, RangeRecordsAndFailures) {
                                              : std::set<Str>{}));
     }
 }
+// A content module that never reports the end is read no further than its chunk can hold: the
+// map fails (25) and is not kept, so the next mapping reads again.
+TEST_F(ReadCases, AContentModuleThatNeverEndsIsCutOff) {
+    Doc doc(Made("ad"));
+    HookContentReads([](ContentPiece &p) { p.type = p.type == 5 ? 4 : p.type; });
+    ANMapRecord m{28, ANMAP_ORDINAL_TO_POS, Pos(9, 9), 1};
+    EXPECT_EQ(ANMapPosition(doc, &m), AN_ERR_NOTFOUND);
+    HookContentReads({});
+    EXPECT_TRUE(ANMapPosition(doc, &m) == AN_OK && m.pos == Pos(0, 1));
+}
 // Events naming no listed slot (3 free, 10 and 500 beyond) do nothing, answer 0, keep the hover.
 TEST_F(ReadCases, EventsFromNoSlot) {
     Doc doc(Made("..........", "H2-6#1 H4-8#2 O5"));
