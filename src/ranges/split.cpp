@@ -31,7 +31,7 @@ void ANTrimStart(DAHandle doc, const ANInstance *instance, ANAnnoRecord *entry) 
 
 // The range ends right after its last good position up to and including its end
 // position, never later than before. Without a position after that one (the
-// document's end) the end comes in to the good position itself.
+// document's end) it ends one step past it, as a point does, and so still covers it.
 void ANPullInEnd(DAHandle doc, const ANInstance *instance, ANAnnoRecord *entry) {
     ANPos good = entry->start;
     ANPos x = entry->start;
@@ -40,7 +40,7 @@ void ANPullInEnd(DAHandle doc, const ANInstance *instance, ANAnnoRecord *entry) 
         if (!ANStepRangePos(doc, &x)) break;
     }
     ANPos after = good;
-    ANStepRangePos(doc, &after);
+    if (!ANStepRangePos(doc, &after)) after = ANStepAfter(good);
     if (ANPosBefore(after, entry->end)) entry->end = after;
 }
 

@@ -216,8 +216,10 @@ TEST_F(ReadCases, Rows) {
         "...S......|T3|r 3:0-6|R4-6", ten + "R3-6 P4|r 1-8|R1-8", "....SS....||r 1-5|R1-4",
         "..SsS.....||r 2-4|R3-4", "....c....||r 2-2|R2-3", "....c....||r 4-4|R4-5",
         "..Ss.....||r 2-6|R4-6", ten + "H1-4|r 2-5|R2-5", ten + "R0-2|r 2-4|R0-4",
-        ten + "P2|r 2-5|R2-5", "......||r 2-50|R2-5",
-        // Past the document's end the one-position case gets the one-step end, not an empty range.
+        ten + "P2|r 2-5|R2-5",
+        // A range past the document's end covers the last position (its end one step past it);
+        // past the end the one-position case gets the one-step end, not an empty range.
+        "......||r 2-50|R2-5.0", "......||r 2-5|R2-5",
         "......||r 40-50|R40-40.0", "......||r 60-60|R60-60.0", "......||r 5-5|R5-5.0",
         "..c..c..c..c..c..c..c..c..c..c..c..c..c..c..c..c||r 0-47|R0-2 M2 R3-5 M5 R6-8 M8 R9-11 "
             "M11 R12-14 M14 R15-17 M17 R18-20 M20 R21-23 M23 R24-26 M26 R27-29 M29 R30-32 M32 "
