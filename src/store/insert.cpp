@@ -178,13 +178,20 @@ struct TextAround {
     uint16_t following = AN_NONE;    // the type-5 entry next after, unless a placeholder is first
 };
 
+// (i, 0xFFFFFFFF) and (i, 0) sort as one anchor, so their entries interleave in the
+// list; each keeps its own text.
+bool SortsWithAnchor(const ANPos &a, const ANPos &b) {
+    const auto sub = [](uint32_t s) { return s == ANPOS_NOSUBITEM ? 0 : s; };
+    return a.itemId == b.itemId && sub(a.subItemId) == sub(b.subItemId);
+}
+
 TextAround LookAround(const ANEntryTable *table, uint16_t prev, uint16_t next, const ANPos &start) {
     TextAround around;
     bool metText = false;
     for (uint16_t i = prev; i != AN_NONE; i = ANSlot(table, i).prev) {
         const ANEntry &entry = ANSlot(table, i);
-        if (!ANSameAnchor(entry.record.start, start)) break;
-        if (!IsText(entry.type)) continue;
+        if (!SortsWithAnchor(entry.record.start, start)) break;
+        if (!ANSameAnchor(entry.record.start, start) || !IsText(entry.type)) continue;
         around.before += TextUnits(entry);
         if (!metText && entry.type == AN_TYPE_TEXT) around.mergeTarget = i;
         metText = true;
@@ -192,8 +199,8 @@ TextAround LookAround(const ANEntryTable *table, uint16_t prev, uint16_t next, c
     bool metFollowing = false;
     for (uint16_t i = next; i != AN_NONE; i = ANSlot(table, i).next) {
         const ANEntry &entry = ANSlot(table, i);
-        if (!ANSameAnchor(entry.record.start, start)) break;
-        if (!IsText(entry.type)) continue;
+        if (!SortsWithAnchor(entry.record.start, start)) break;
+        if (!ANSameAnchor(entry.record.start, start) || !IsText(entry.type)) continue;
         around.after += TextUnits(entry);
         if (!metFollowing && entry.type == AN_TYPE_TEXT) around.following = i;
         metFollowing = true;

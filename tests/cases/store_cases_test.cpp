@@ -162,6 +162,7 @@ TEST_F(Store, SequencesLeaveTheirTable) {
         "JoinOutOfMemoryGives13: 1|t1'" X16 X16 "xxxxxxxx' #1/2 t1'" Y16
         "yyyyyyyy'/3 p:45/4 N F "
         "e/2!13|1@:40 4@:44 3@1|" X16 X16 "xxxxxxxx" Y16 "yyyyyyyy",
+        "SiblingAnchorsBothWithText: 3|t3'ab' t3.0'cd'/2 t:1'X'/3 #:3/4 t3.0:1'Y'/5|1 4 1 2|aXb#",
         "FailedTextMovesNothing: 2|t2'ab' p:1/2 h:0-:2/3 F t:1'xy'!13 F #:1!13|3@:0-:2 2@:1 1|ab",
         "TextGrowsInPlace: 2|t2'" X16 X16 X16
         "xxxxxxxxxxxxxxx' t3'z'/2 F t2'yy'!13 F t:5'ab'!13 "
