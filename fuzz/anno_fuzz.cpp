@@ -173,12 +173,6 @@ std::vector<std::pair<ANPos, uint32_t>> TextAnchors(const std::vector<Entry> &li
     return out;
 }
 
-// (i, 0xFFFFFFFF) and (i, 0): two anchors that sort as one.
-bool Siblings(const ANPos &a, const ANPos &b) {
-    return a.itemId == b.itemId && (a.subItemId ^ b.subItemId) == ~0u &&
-           a.subItemId * b.subItemId == 0;
-}
-
 ANPos PickPos(Input &in, const Document &d) {
     const uint32_t how = in.below(20);
     if (how < 9) {
@@ -509,8 +503,7 @@ void Run::CheckAdded(Document &d, uint16_t type, const ANPos &at, const std::vec
     // Not at a kind of the caller's own, nor where copying mixed texts at one anchor, ...
     bool plain = !d.mixedText && (at.kind == 0 || at.kind == ANPOS_ANNOTEXT);
     for (const Entry &e : before)  // nor beside a sibling anchor with annotations (left open)
-        plain &=
-            (e.record.start.kind == 0 || e.record.start.kind == 5) && !Siblings(e.record.start, at);
+        plain &= (e.record.start.kind == 0 || e.record.start.kind == 5);
     if ((type == AN_TYPE_TEXT || type == AN_TYPE_PLACEHOLDER) && plain) {
         std::u16string expected = AnchorText(before, at);
         const size_t k = at.kind == ANPOS_ANNOTEXT ? at.textIndex : expected.size();
