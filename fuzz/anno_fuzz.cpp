@@ -98,7 +98,7 @@ struct Document {
     std::set<uint64_t> blocks;  // userData blocks handed to this document, still live
     ANTrackInfo stale{};        // a tracking record kept across changes
     ANAnnoTextTrack staleText{};
-    bool staleTextStarted = false, mixedText = false;  // mixed: copied into while holding some
+    bool staleTextStarted = false;
     bool noStylesMaybe = false;  // bound under a failure: its style table may not exist
 };
 
@@ -500,10 +500,9 @@ void Run::Add(Document &d) {
 void Run::CheckAdded(Document &d, uint16_t type, const ANPos &at, const std::vector<Entry> &before,
                      const std::vector<uint16_t> &text, const ANAnnoRecord *heard) {
     const std::vector<Entry> after = ListEntries(d.handle);
-    // Not at a kind of the caller's own, nor where copying mixed texts at one anchor, ...
-    bool plain = !d.mixedText && (at.kind == 0 || at.kind == ANPOS_ANNOTEXT);
-    for (const Entry &e : before)  // nor beside a sibling anchor with annotations (left open)
-        plain &= (e.record.start.kind == 0 || e.record.start.kind == 5);
+    // Not at a kind of the caller's own.
+    bool plain = at.kind == 0 || at.kind == ANPOS_ANNOTEXT;
+    for (const Entry &e : before) plain &= e.record.start.kind == 0 || e.record.start.kind == 5;
     if ((type == AN_TYPE_TEXT || type == AN_TYPE_PLACEHOLDER) && plain) {
         std::u16string expected = AnchorText(before, at);
         const size_t k = at.kind == ANPOS_ANNOTEXT ? at.textIndex : expected.size();
@@ -769,7 +768,6 @@ void Run::Copy(Document &) {
     // would only measure that.
     if (source.size() + target.size() > 1500) return;
     const uint32_t rc = CALL(ANCopyAnnos(dest->handle, src->handle));
-    dest->mixedText |= src != dest && (src->mixedText || !target.empty());
     CHECK(dest->recorder.notes.empty() && src->recorder.notes.empty(), "copying notified");
     if (src != dest)
         CHECK(SameListing(source, ListEntries(src->handle)), "copying changed the source");
@@ -782,15 +780,19 @@ void Run::Copy(Document &) {
         CHECK(SameListing(target, after), "copying nothing, or onto itself, changed the target");
         return;
     }
+    // The destination's annotation text at every anchor, then the source's.
+    for (const std::vector<Entry> *list : {&source, &target})
+        for (const Entry &y : *list)
+            CHECK(!IsText(y) ||
+                      AnchorText(after, y.record.start) ==
+                          AnchorText(target, y.record.start) + AnchorText(source, y.record.start),
+                  "copied annotation text at " + Text(y.record.start));
     if (!target.empty()) return;
-    // Into an empty document: the same annotation text at every anchor, and every point,
-    // highlight and cut marker once more (texts and ranges may join).
+    // Into an empty document: every point, highlight and cut marker once more (texts and
+    // ranges may join).
     CHECK(after.size() <= source.size(), "made " + N(after.size()) + " of " + N(source.size()));
     std::vector<bool> used(after.size());
     for (const Entry &y : source) {
-        if (IsText(y))
-            CHECK(AnchorText(after, y.record.start) == AnchorText(source, y.record.start),
-                  "copied annotation text at " + Text(y.record.start));
         if (IsText(y) || y.type == AN_TYPE_RANGE) continue;
         size_t i = 0;
         for (; i < after.size(); ++i) {

@@ -464,7 +464,8 @@ uint32_t InsertIntoTable(ANInstance *instance, uint16_t type, ANAnnoRecord *reco
         next = prev;
         prev = ANSlot(table, prev).prev;
     }
-    const TextAround around = LookAround(table, prev, next, record->start);
+    TextAround around = LookAround(table, prev, next, record->start);
+    if (mode == ANINSERT_COPY_APART) around.mergeTarget = around.following = AN_NONE;
     const uint32_t width = type == AN_TYPE_TEXT ? record->textLength : 1;
     if (mode == ANINSERT_ADD && record->start.kind == ANPOS_ANNOTEXT &&
         !TextIndexInside(table, around, record->start.textIndex)) {
@@ -509,7 +510,9 @@ uint32_t ANInsertEntry(ANInstance *instance, uint16_t type, ANAnnoRecord *record
                        uint16_t entryFlags) {
     if (instance == nullptr || record == nullptr) return AN_ERR_BADARG;
     if (type < AN_TYPE_HILITE || type > AN_TYPE_CUTMARK) return AN_ERR_BADARG;
-    if (mode != ANINSERT_ADD && mode != ANINSERT_COPY) return AN_ERR_BADARG;
+    if (mode != ANINSERT_ADD && mode != ANINSERT_COPY && mode != ANINSERT_COPY_APART) {
+        return AN_ERR_BADARG;
+    }
 
     // Text given as an entry's buffer (copying) is read through `text`; the record
     // gets its buffer back whatever happens, so the source entry stays as it was.

@@ -21,6 +21,9 @@
 // Insertion modes.
 constexpr uint32_t ANINSERT_ADD = 0;   // adding: text positions around new text shift
 constexpr uint32_t ANINSERT_COPY = 1;  // copying from another document: positions kept
+// Copying text to an anchor whose text the destination has too: positions kept, and
+// the text goes into an entry of its own, never into the destination's.
+constexpr uint32_t ANINSERT_COPY_APART = 2;
 
 // Puts one annotation of `type` into the document's table at its place in document
 // order; makes the table on first use and grows it by 10 slots when one free slot

@@ -172,6 +172,9 @@ TEST_F(Store, SequencesLeaveTheirTable) {
         "SelectionByFlagsAndTag: 1|p0/2 p1/4 p2/6 p3/7 p4/0x80000007 p5/0x80000006 p6/14 x1/7 "
         "x0x4000/14 x0x3000/6 x0x2001/4 x0/0 e/0x80000007 x0x1000/6|||6 4 2 7 14 0x80000007 "
         "0x80000006",
+        // Copied text follows the destination's at an anchor both have text at, renumbered.
+        "CopyToAnAnchorWithText: 2|S t2'abc' #:1/0x162 #:3 p:3 K K e/0x162|1@:2 1@:2 1@:3 1@:4 "
+        "1@:6 1@:6 1@:7 1|ab#cab#c|0x162 0x162",
         // Copies merge by position, the destination's entry first on ties; onto itself: nothing
         "CopiesMergeByPosition: 1|h0-3/0xD0 p5/0xD1 S h7-9/0x52 p4/0x51 v5/0x53 h0-1/0x50 K "
         "k|0xD0 0x50 0x51 0xD1 0x53 0x52",
