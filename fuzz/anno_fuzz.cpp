@@ -95,10 +95,7 @@ struct Document {
     uint32_t ranges = 0;
     Recorder recorder;
     bool callback = false;
-    std::set<uint64_t> blocks;  // userData blocks handed to this document, still live
-    ANTrackInfo stale{};        // a tracking record kept across changes
-    ANAnnoTextTrack staleText{};
-    bool staleTextStarted = false;
+    std::set<uint64_t> blocks;   // userData blocks handed to this document, still live
     bool noStylesMaybe = false;  // bound under a failure: its style table may not exist
 };
 
@@ -281,7 +278,7 @@ class Run {
     void Add(Document &d), Clear(Document &d), ClearUserData(Document &d), Track(Document &d),
         TextReads(Document &d), Event(Document &d), Find(Document &d), Map(Document &d),
         Styles(Document &d), Copy(Document &), Build(Document &d), Step(Document &d),
-        Callback(Document &d), Lifecycle(Document &d), Stale(Document &d), ArmFailure(Document &);
+        Callback(Document &d), Lifecycle(Document &d), ArmFailure(Document &);
 
     Input &in_;
     Document a_, b_;
@@ -291,9 +288,7 @@ class Run {
     // The failure ArmFailure chose, armed when the next operation begins.
     uint32_t pendingAllocation_ = 0, pendingCall_ = 0, pendingCode_ = 0;
     bool pendingSticky_ = false;
-#if ANNO_FUZZ_PLATFORM_CONTROLS
     int64_t heapAtStart_ = 0, globalAtStart_ = 0;
-#endif
 };
 
 void Run::CheckRules(const std::string &when) {
@@ -342,19 +337,17 @@ void Run::Go() {
     // ANNO_FUZZ_TRACE=1 prints each operation as it ends: what a hang was doing.
     static const bool trace = std::getenv("ANNO_FUZZ_TRACE") != nullptr;
     static constexpr Op kOps[] = {
-        {15, &Run::Add, false},  {18, &Run::Clear, false},     {19, &Run::ClearUserData, false},
-        {22, &Run::Track, true}, {24, &Run::TextReads, true},  {26, &Run::Event, true},
-        {28, &Run::Find, true},  {29, &Run::Map, true},        {31, &Run::Styles, true},
-        {32, &Run::Copy, false}, {33, &Run::Build, false},     {34, &Run::Step, true},
-        {35, &Run::Step, true},  {36, &Run::Callback, false},  {37, &Run::Lifecycle, false},
-        {38, &Run::Stale, true}, {40, &Run::ArmFailure, false}};
+        {15, &Run::Add, false},       {18, &Run::Clear, false},    {19, &Run::ClearUserData, false},
+        {22, &Run::Track, true},      {24, &Run::TextReads, true}, {26, &Run::Event, true},
+        {28, &Run::Find, true},       {29, &Run::Map, true},       {31, &Run::Styles, true},
+        {32, &Run::Copy, false},      {33, &Run::Build, false},    {34, &Run::Step, true},
+        {35, &Run::Step, true},       {36, &Run::Callback, false}, {37, &Run::Lifecycle, false},
+        {40, &Run::ArmFailure, false}};
     trail.clear();
     SetContext("setting up");
     ClearFailures();
-#if ANNO_FUZZ_PLATFORM_CONTROLS
-    heapAtStart_ = anwin::heapBlocks();
-    globalAtStart_ = anwin::globalBlocks();
-#endif
+    heapAtStart_ = annotest::HeapBlocks();
+    globalAtStart_ = annotest::GlobalBlocks();
     a_.handle = BuildDocument(in_, 24, &a_.ranges);
     b_.handle = BuildDocument(in_, 8, &b_.ranges);
     Describe(a_);
@@ -370,8 +363,6 @@ void Run::Go() {
     }
     Bind(a_, in_.chance(220));
     Bind(b_, in_.chance(160));
-    for (Document *d : {&a_, &b_})
-        d->staleTextStarted = CALL(ANStartAnnoTextTrack(d->handle, &d->staleText)) == 0;
     Fill(a_);
     if (settings.arm) settings.arm();
 
@@ -889,21 +880,6 @@ void Run::Lifecycle(Document &d) {
     if (how != 3 && !Bound(d)) Bind(d, in_.chance(200));
 }
 
-void Run::Stale(Document &d) {
-    // Records kept across changes of the annotations answer stale things, but safely.
-    const ANPos p = PickPos(in_, d);
-    trail.back() += ": stale records at " + Text(p);
-    const uint32_t how = in_.below(4);
-    if (how == 0) CALL(ANStartAnnoTrack(d.handle, &p, &d.stale));
-    if (how == 1 || how == 2) CALL(ANTrackAnno(d.handle, &p, &d.stale));
-    if (how == 3 && d.staleTextStarted) {
-        uint16_t unit = 0;
-        const uint32_t rc = CALL(ANGetAnnoText(d.handle, &d.staleText, &p, &unit));
-        CHECK(faulty_ || rc == 5 || rc == 6 || rc == AN_ERR_NOTFOUND || rc == AN_ERR_NOSTATE,
-              "a stale text read gave " + N(rc));
-    }
-}
-
 void Run::ArmFailure(Document &) {
     armNext_ = true;
     const uint32_t n = 1 + in_.below(48);
@@ -947,8 +923,6 @@ void Run::Finish() {
     trail.push_back("finish");
     ClearFailures();
     for (Document *d : {&a_, &b_}) {
-        CALL(ANEndAnnoTextTrack(d->handle, &d->staleText));
-        CHECK(d->staleText.segs == nullptr, "an ended text track keeps its list");
         if (Bound(*d)) {
             faulty_ = false;
             ClearUserData(*d);
@@ -962,10 +936,10 @@ void Run::Finish() {
     antk::destroyDocument(b_.handle);
     if (global_ != nullptr)
         CHECK(CALL(ANDeInitGlobalHiliteStyles(global_)) == 0, "freeing the global styles");
+    CHECK(annotest::HeapBlocks() == heapAtStart_,
+          N(annotest::HeapBlocks() - heapAtStart_) + " heap blocks leaked");
+    CHECK(annotest::GlobalBlocks() == globalAtStart_, "global blocks leaked");
 #if ANNO_FUZZ_PLATFORM_CONTROLS
-    CHECK(anwin::heapBlocks() == heapAtStart_,
-          N(anwin::heapBlocks() - heapAtStart_) + " heap blocks leaked");
-    CHECK(anwin::globalBlocks() == globalAtStart_, "global blocks leaked");
     CHECK(anwin::globalLocks() == 0, "global blocks left locked");
 #endif
 }

@@ -240,7 +240,6 @@ TEST_F(Store, EveryDescriptorFormIsStoredNormalised) {
 // ---- Copying; ANClearUserData frees once only blocks handed over with types 1, 3, 5 (counted).
 ANHiliteStyle Style(uint32_t id, uint32_t c) { return {ANHILITESTYLE_SIZE, id, 1, c, 0, 0, 0, 0}; }
 TEST_F(Store, CopyingAndFreeingUserData) {
-    ANNO_REQUIRE_PLATFORM_CONTROLS();
     Doc src(PlainDocument(20)), doc(PlainDocument(20));
     ASSERT_EQ(Init(src) + Init(doc), AN_OK);
     for (const ANHiliteStyle &s : {Style(7, 0xFF), Style(8, 0xFF00)}) ANAddHiliteStyle(src, &s);

@@ -11,19 +11,19 @@ void LeakCheckedTest::SetUp() {
     antk::clearFailures();
 #if ANNO_HAVE_PLATFORM_CONTROLS
     anwin::clearFailures();
-    heapAtStart_ = anwin::heapBlocks();
-    globalAtStart_ = anwin::globalBlocks();
 #endif
+    heapAtStart_ = HeapBlocks();
+    globalAtStart_ = GlobalBlocks();
 }
 
 void LeakCheckedTest::TearDown() {
     antk::clearFailures();
 #if ANNO_HAVE_PLATFORM_CONTROLS
     anwin::clearFailures();
-    EXPECT_EQ(anwin::heapBlocks(), heapAtStart_) << "process-heap blocks leaked";
-    EXPECT_EQ(anwin::globalBlocks(), globalAtStart_) << "global-memory blocks leaked";
     EXPECT_EQ(anwin::globalLocks(), 0) << "global-memory blocks left locked";
 #endif
+    EXPECT_EQ(HeapBlocks(), heapAtStart_) << "process-heap blocks leaked";
+    EXPECT_EQ(GlobalBlocks(), globalAtStart_) << "global-memory blocks leaked";
 }
 
 Doc::~Doc() {

@@ -20,15 +20,6 @@
 #define ANNO_HAVE_PLATFORM_CONTROLS 0
 #endif
 
-// Skips a test that needs the platform layer's block counters or failure injection,
-// which the system's own heap (Windows) does not offer.
-#if ANNO_HAVE_PLATFORM_CONTROLS
-#define ANNO_REQUIRE_PLATFORM_CONTROLS() (void)0
-#else
-#define ANNO_REQUIRE_PLATFORM_CONTROLS() \
-    GTEST_SKIP() << "needs the failure injection and block counters of anno_winapi"
-#endif
-
 namespace annotest {
 
 // Checks at tear-down that the live block counts are back where they started.

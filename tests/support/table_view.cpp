@@ -9,6 +9,76 @@
 #include "hosts/platform.h"
 #include "store/table.h"
 
+#if defined(_WIN32)
+#include <windows.h>
+
+#include <atomic>
+#include <utility>
+
+// On Windows the library takes its memory from the system itself. Its live blocks are
+// counted by sending anno.dll's imports of the allocation functions (its import address
+// table) through counting wrappers, so that only the library's blocks count.
+namespace {
+std::atomic<int64_t> gHeap{0}, gGlobal{0};
+template <typename T>
+T Counted(std::atomic<int64_t> &count, T block) {
+    return count += block != nullptr, block;
+}
+LPVOID WINAPI HeapAllocCounted(HANDLE h, DWORD f, SIZE_T n) {
+    return Counted(gHeap, HeapAlloc(h, f, n));
+}
+BOOL WINAPI HeapFreeCounted(HANDLE h, DWORD f, LPVOID b) {
+    return gHeap -= b != nullptr, HeapFree(h, f, b);
+}
+HGLOBAL WINAPI GlobalAllocCounted(UINT f, SIZE_T n) { return Counted(gGlobal, GlobalAlloc(f, n)); }
+HGLOBAL WINAPI GlobalFreeCounted(HGLOBAL b) { return gGlobal -= b != nullptr, GlobalFree(b); }
+bool CountLibraryBlocks() {
+    auto *base = reinterpret_cast<BYTE *>(GetModuleHandleA("anno.dll"));
+    if (base == nullptr) return false;
+    const auto *nt = reinterpret_cast<const IMAGE_NT_HEADERS *>(
+        base + reinterpret_cast<const IMAGE_DOS_HEADER *>(base)->e_lfanew);
+    const DWORD imports =
+        nt->OptionalHeader.DataDirectory[IMAGE_DIRECTORY_ENTRY_IMPORT].VirtualAddress;
+    const std::pair<const char *, void *> wrappers[] = {
+        {"HeapAlloc", reinterpret_cast<void *>(&HeapAllocCounted)},
+        {"HeapFree", reinterpret_cast<void *>(&HeapFreeCounted)},
+        {"GlobalAlloc", reinterpret_cast<void *>(&GlobalAllocCounted)},
+        {"GlobalFree", reinterpret_cast<void *>(&GlobalFreeCounted)}};
+    for (auto *d = reinterpret_cast<IMAGE_IMPORT_DESCRIPTOR *>(base + imports); d->Name; ++d) {
+        auto *name = reinterpret_cast<IMAGE_THUNK_DATA *>(base + d->OriginalFirstThunk);
+        for (auto *slot = reinterpret_cast<IMAGE_THUNK_DATA *>(base + d->FirstThunk);
+             name->u1.AddressOfData != 0; ++name, ++slot) {
+            const auto *fn =
+                reinterpret_cast<IMAGE_IMPORT_BY_NAME *>(base + name->u1.AddressOfData);
+            for (const auto &[wanted, wrapper] : wrappers) {
+                if (IMAGE_SNAP_BY_ORDINAL(name->u1.Ordinal) || std::strcmp(fn->Name, wanted))
+                    continue;
+                DWORD was = 0;
+                VirtualProtect(&slot->u1.Function, sizeof(void *), PAGE_READWRITE, &was);
+                slot->u1.Function = reinterpret_cast<ULONG_PTR>(wrapper);
+                VirtualProtect(&slot->u1.Function, sizeof(void *), was, &was);
+            }
+        }
+    }
+    return true;
+}
+}  // namespace
+
+namespace annotest {
+int64_t HeapBlocks() {
+    static const bool counting = CountLibraryBlocks();
+    return counting ? gHeap.load() : 0;
+}
+int64_t GlobalBlocks() { return HeapBlocks(), gGlobal.load(); }
+}  // namespace annotest
+#else
+#include "anno/winapi_test.h"
+namespace annotest {
+int64_t HeapBlocks() { return anwin::heapBlocks(); }
+int64_t GlobalBlocks() { return anwin::globalBlocks(); }
+}  // namespace annotest
+#endif
+
 namespace annotest {
 
 namespace {
@@ -143,11 +213,17 @@ std::u16string AnchorText(const std::vector<Entry> &list, const ANPos &anchor,
 }
 
 uint64_t NewHeapBlock(size_t bytes) {
-    return static_cast<uint64_t>(
-        reinterpret_cast<uintptr_t>(HeapAlloc(GetProcessHeap(), 0, bytes)));
+    void *block = HeapAlloc(GetProcessHeap(), 0, bytes);
+#if defined(_WIN32)
+    gHeap += block != nullptr;  // the library may free it
+#endif
+    return static_cast<uint64_t>(reinterpret_cast<uintptr_t>(block));
 }
 
 void FreeHeapBlock(uint64_t block) {
+#if defined(_WIN32)
+    gHeap -= block != 0;
+#endif
     HeapFree(GetProcessHeap(), 0, reinterpret_cast<void *>(static_cast<uintptr_t>(block)));
 }
 

@@ -43,6 +43,11 @@ std::string DocumentRulesBroken(DAHandle doc);
 std::u16string AnchorText(const std::vector<Entry> &list, const ANPos &anchor,
                           char16_t placeholder = u'\xFFFF');
 
+// Live blocks the library and NewHeapBlock took from the process heap and global memory:
+// the platform layer's counters, or on Windows counting wrappers in anno.dll's imports.
+int64_t HeapBlocks();
+int64_t GlobalBlocks();
+
 // A caller block from the process heap, as userData of types 1, 3 and 5 may be.
 uint64_t NewHeapBlock(size_t bytes);
 void FreeHeapBlock(uint64_t block);
