@@ -317,8 +317,11 @@ AN_API uint32_t ANClearAnnos(DAHandle doc, uint16_t flags, uint32_t value);
 
 /* Frees, as process-heap blocks, the userData values that callers gave with
  * annotations of types 1, 3 and 5 through ANAddAnno, once per block, and sets them
- * to 0. Values the library did not receive as such blocks (built annotations, copies
- * from another document) are never freed. Works under the module-data lock.
+ * to 0; also the blocks of such annotations that merged into others or went without
+ * a removal notification (texts joined, ranges emptied by a clear), which the document
+ * keeps until this call. Values the library did not receive as such blocks (built
+ * annotations, copies from another document) are never freed. Works under the
+ * module-data lock.
  * Returns 15 (null doc), a DARetrieveDocHandle failure unchanged, otherwise 0. */
 AN_API uint32_t ANClearUserData(DAHandle doc);
 
