@@ -71,8 +71,7 @@ struct SlotIndex {
     int operator[](uint16_t slot) const { return slot < at.size() ? at[slot] : -1; }
     std::vector<int> at;
 };
-// Whether two listings are the same entries with the same records and texts (where and
-// how large a text's buffer is aside).
+// Whether two listings are the same entries, records and texts (text buffers aside).
 bool SameListing(const std::vector<Entry> &a, const std::vector<Entry> &b);
 
 // How the runs of one process decode their inputs (the fuzzer keeps the defaults).

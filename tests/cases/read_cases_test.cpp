@@ -343,8 +343,7 @@ TEST_F(ReadCases, RangeRecordsAndFailures) {
                                              : std::set<Str>{}));
     }
 }
-// A content module that never reports the end is read no further than its chunk can hold: the
-// map fails (25) and is not kept, so the next mapping reads again.
+// A content module that never ends is cut off where its chunk must end: 25, and read anew later.
 TEST_F(ReadCases, AContentModuleThatNeverEndsIsCutOff) {
     Doc doc(Made("ad"));
     HookContentReads([](ContentPiece &p) { p.type = p.type == 5 ? 4 : p.type; });
