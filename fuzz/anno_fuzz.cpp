@@ -355,10 +355,9 @@ void Run::Go() {
     Describe(b_);
     if (in_.chance(220)) {
         CHECK(CALL(ANInitGlobalHiliteStyles(&global_)) == 0, "making a global style table");
-        for (uint32_t i = in_.below(12); i > 0; --i) {
-            const ANHiliteStyle s =
-                NewStyle(in_, in_.chance(200) ? ANHILITESTYLE_SIZE : ANHILITESTYLE_SIZE_OLD, 10,
-                         0xFFFFFF, false);
+        for (uint32_t i = in_.below(12), size = 0; i > 0; --i) {
+            size = in_.chance(200) ? ANHILITESTYLE_SIZE : ANHILITESTYLE_SIZE_OLD;
+            const ANHiliteStyle s = NewStyle(in_, size, 10, 0xFFFFFF, false);
             CHECK(CALL(ANAddGlobalHiliteStyle(global_, &s)) == 0, "adding a global style");
         }
     }
@@ -820,8 +819,7 @@ void Run::Build(Document &d) {
 void Run::Step(Document &d) {
     trail.back() += ": stepping";
     if (!faulty_ && Bound(d)) {
-        // The merged walk meets every content position in order, text only where
-        // there is some, and ends.
+        // The merged walk meets every content position in order, text only where there is some.
         const std::vector<ANPos> walk = WalkPositions(d, true);
         std::vector<ANPos> textAnchors, visited;  // visited: content and text anchors met
         for (const auto &a : TextAnchors(ListEntries(d.handle))) textAnchors.push_back(a.first);
@@ -831,9 +829,8 @@ void Run::Step(Document &d) {
             CHECK(AtAnchor(textAnchors, p) || (!inText && isContent(p)), "the walk met " + Text(p));
             if (!inText) visited.push_back(p);
         }
-        // Every content position is met up to the first anchor of annotation text that
-        // is not content (a text item itself, or a place the chunker does not have),
-        // from where stepping goes on as the chunker answers.
+        // Up to the first text anchor that is not content (a text item itself, or a place the
+        // chunker does not have; from there stepping goes as the chunker answers).
         const auto s = std::find_if_not(walk.begin(), walk.end(), isContent);
         const ANPos stray = s == walk.end() ? ANPos{0xFFFFFFFFu, 0xFFFFFFFFu, 0, 0} : *s;
         for (const ANPos &c : d.content) {
@@ -901,8 +898,7 @@ void Run::ArmFailure(Document &) {
 }
 
 void Run::Fill(Document &d) {
-    // Every type but ranges (whose splitting would make the count unpredictable), spread
-    // over the document by a fixed sequence, so the table has `fillers` entries.
+    // `fillers` entries of every type but ranges (their count varies), by a fixed sequence.
     uint32_t seed = 12345;
     for (uint32_t i = 0; i < settings.fillers && Bound(d); ++i) {
         seed = seed * 1103515245u + 12345u;
@@ -942,9 +938,8 @@ void Run::Finish() {
     antk::destroyDocument(b_.handle);
     if (global_ != nullptr)
         CHECK(CALL(ANDeInitGlobalHiliteStyles(global_)) == 0, "freeing the global styles");
-    CHECK(annotest::HeapBlocks() == heapAtStart_,
-          N(annotest::HeapBlocks() - heapAtStart_) + " heap blocks leaked");
-    CHECK(annotest::GlobalBlocks() == globalAtStart_, "global blocks leaked");
+    CHECK(annotest::HeapBlocks() == heapAtStart_ && annotest::GlobalBlocks() == globalAtStart_,
+          "heap or global blocks leaked");
 #if ANNO_FUZZ_PLATFORM_CONTROLS
     CHECK(anwin::globalLocks() == 0, "global blocks left locked");
 #endif

@@ -355,15 +355,20 @@ TEST_F(Store, BindingMakesFindsAndDropsTheState) {
                   std::tuple(rc == 0 && option != kTop, rc != 0, uint64_t(asked),
                              uint64_t(rc != 0 || option != kTop)));
     }
-    Doc doc(PlainDocument(2));
-    ASSERT_FALSE(Init(doc) || AddPoint(doc, Pos(1)));
+    Doc doc(PlainDocument(2)), bare(PlainDocument(2));
+#if ANNO_HAVE_PLATFORM_CONTROLS
+    anwin::failAllocation(2);  // its style table: then there is none, and styles are refused
+#endif
+    ASSERT_FALSE(Init(doc) || Init(bare) || AddPoint(doc, Pos(1)));
+    const ANHiliteStyle style{ANHILITESTYLE_SIZE, 7, 0, 0, 0, 0, 0, 0};
+    EXPECT_EQ(ANAddHiliteStyle(doc, &style) + ANCopyAnnos(bare, doc),
+              15u * ANNO_HAVE_PLATFORM_CONTROLS);
     antk::failCall(Fn::DALockModuleData, 1, 55);
     EXPECT_EQ(ANDeInit(doc), 55u);
     EXPECT_EQ(ListEntries(doc).size(), 1u) << "a failed de-init keeps the state";
 }
-// A caller's block whose annotation merges into another (touching ranges, text appended) or
-// goes unannounced (texts joined round a cleared placeholder, a range emptied with its text) is
-// freed, unless another annotation still owns it; the fixture counts the heap's blocks.
+// A caller's block whose annotation merges (ranges, text) or goes unannounced (a join, an emptied
+// range) is freed by ANClearUserData, unless another annotation owns it (the fixture counts).
 TEST_F(Store, BlocksOfAnnotationsThatMergeOrGoUnannouncedAreFreed) {
     Doc doc(PlainDocument(20));
     const uint64_t shared = NewHeapBlock(8);
