@@ -271,6 +271,7 @@ void ANFreeUserDataBlocks(ANEntryTable *table) {
             other.record.userData = 0;
             other.flags = static_cast<uint16_t>(other.flags & ~ANENTRY_OWNS_USERDATA);
         }
+        // NOLINTNEXTLINE(performance-no-int-to-ptr): userData holds the block
         ANHeapFree(reinterpret_cast<void *>(static_cast<uintptr_t>(block)));
         entry.record.userData = 0;
         entry.flags = static_cast<uint16_t>(entry.flags & ~ANENTRY_OWNS_USERDATA);

@@ -166,6 +166,7 @@ void ANFreeOrphanBlocks(ANInstance *instance) {
             const ANEntry &entry = ANSlot(table, i);
             held = (entry.flags & ANENTRY_OWNS_USERDATA) != 0 && entry.record.userData == block;
         }
+        // NOLINTNEXTLINE(performance-no-int-to-ptr): userData holds the block
         if (!held) ANHeapFree(reinterpret_cast<void *>(static_cast<uintptr_t>(block)));
     }
     instance->orphanCount = 0;
