@@ -217,8 +217,7 @@ TEST_F(ReadCases, Rows) {
         "..SsS.....||r 2-4|R3-4", "....c....||r 2-2|R2-3", "....c....||r 4-4|R4-5",
         "..Ss.....||r 2-6|R4-6", ten + "H1-4|r 2-5|R2-5", ten + "R0-2|r 2-4|R0-4",
         ten + "P2|r 2-5|R2-5",
-        // A range past the document's end covers the last position (its end one step past it);
-        // past the end the one-position case gets the one-step end, not an empty range.
+        // Past the document's end a range ends one step past its last position; so does one there.
         "......||r 2-50|R2-5.0", "......||r 2-5|R2-5",
         "......||r 40-50|R40-40.0", "......||r 60-60|R60-60.0", "......||r 5-5|R5-5.0",
         "..c..c..c..c..c..c..c..c..c..c..c..c..c..c..c..c||r 0-47|R0-2 M2 R3-5 M5 R6-8 M8 R9-11 "
