@@ -195,7 +195,7 @@ TEST_F(ReadCases, Rows) {
           Style(21, 1, 0xABC, 0xDEF, 5, 6), Style(22, 2, 0xABC, 0xDEF, 5, 6),
           Style(23, 4, 0xABC, 0xDEF, 5, 6), Style(24, ~7u, 0xABC, 0xDEF, 5, 6)})
         ASSERT_EQ(ANAddGlobalHiliteStyle(global, &s), AN_OK);
-    const Str ten = "..........|", st = "...|H1-3/", map = "phpx/apd/lp||";
+    const Str ten = "..........|", st = "...|H1-3/", map = "phpx/apd/lp||", ix = ten + "O9*300 ";
     const auto S = [&](const char *w, const char *e) { return st + w + "|k 1 1|2h0" + e; };
     // clang-format off
     const Str rows[] = {
@@ -212,7 +212,7 @@ TEST_F(ReadCases, Rows) {
         "....cS....||r 1-8|R1-4 M4 R6-8", "..SSc....||r 0-7|R0-2 M4 R5-7", ten + "M3|r 3-5|m3 R4-5",
         "..pq.Sc..||r 1-8|R1-5 M6 R7-8", ten + "M5 M6|r 2-7|R2-7 m5 m6", "....c....||r 4-7|M4 R5-7",
         ten + "M3 R3-5|r 4-7|m3 R4-7", ten + "M6|r 6.0-8|m6 R6.0-8", ten + "R2-7|r 3-5|R2-7 R4-5",
-        ten + "O9*300 M3 R3-5|r 4-7|m3 R4-7", ten + "O9*300 R2-7|r 3-5|R2-7 R4-5",
+        ix + "M3 R3-5|r 4-7|m3 R4-7", ix + "R2-7|r 3-5|R2-7 R4-5", ix + "|r 1-3|R1-3",
         "...S......|T3|r 3:0-6|R4-6", ten + "R3-6 P4|r 1-8|R1-8", "....SS....||r 1-5|R1-4",
         "..SsS.....||r 2-4|R3-4", "....c....||r 2-2|R2-3", "....c....||r 4-4|R4-5",
         "..Ss.....||r 2-6|R4-6", ten + "H1-4|r 2-5|R2-5", ten + "R0-2|r 2-4|R0-4",
@@ -259,8 +259,8 @@ TEST_F(ReadCases, Rows) {
         "pad/p|T65536 P65536 T65536 T1.1|t 1.2|1.2 65536:0 65536:1 65536:2 65536:3 65536:4 !25",
         "pad/p|T1.0 T2.0|n 0|0 1.0:0 1.0:1 1.0 1.1 1.2 2.0:0 2.0:1 2.0 2.3 2.4 65536 !25",
         "pad/p|T1 T2|t 1.1|1.1 2:0 2:1 !25", "pad/p|O3*300 T1 T2 T2.0|t 1.1|1.1 2:0 2:1 !25",
-        "pad/p|O4*300 T1 T1.0 T1.1 T2 T2.0|n 0|0 1:0 1:1 1 1.1:0 1.1:1 1.1 1.2 2:0 2:1 2 2.4 65536 !25",
-        "pad/p|O4*300 T65536 P65536 T65536 T1.1|t 1.2|1.2 65536:0 65536:1 65536:2 65536:3 65536:4 !25",
+        "pad/p|O4*260 T65536 P65536 T65536 T1.1|t 1.2|1.2 65536:0 65536:1 65536:2 65536:3 "
+        "65536:4 !25",
         // ---- Mapping over three chunks, hidden and wide text counted; two maps cached at most.
         map + "m 0 1 2 3 4 5 6 7 8 9 10 11 12 13 14 15 16|1.0 1.1 1.2 1.3 1.4 3.5 3.6 "
             "65536.65536 65536.65537 65536.65538 65538.65539 65538.65540 131072.131072 "

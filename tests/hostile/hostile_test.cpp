@@ -85,8 +85,8 @@ TEST_F(Hostile, EveryExportAnswersHostileArgumentsAsDocumented) {
     const ANTextDesc nullText{sizeof(ANTextDesc), 1, Pos(2), 0, nullptr, 3, 0};
     const uint16_t unit = 'u';  // text of 2^32 - 64 units and more has no 32-bit capacity
     const ANTextDesc huge{48, 1, Pos(12), 0, &unit, ~63u, 0}, on6{48, 1, Pos(6), 0, &unit, ~0u, 0};
-    uint32_t sized[24] = {};  // each type's descriptor in two sizes only other types take
-    const uint32_t wrong[] = {40, 64, 48, 60, 72, 32, 48, 32, 72, 40, 48, 24, 72, 36};
+    uint32_t desc[24] = {};  // each type's descriptor in two sizes only other types take
+    const uint32_t bad[] = {40, 64, 48, 60, 72, 32, 48, 32, 72, 40, 48, 24, 72, 36};
     const std::vector<Entry> list = ListEntries(doc_);
     std::vector<bool> listed(AN_NONE + 1);
     for (const Entry &e : list) listed[e.slot] = true;
@@ -107,7 +107,7 @@ TEST_F(Hostile, EveryExportAnswersHostileArgumentsAsDocumented) {
         ROW(15, 18, 15, 15, All({ANMapPosition(d, nullptr), ANAddHiliteStyle(d, nullptr)})),
         ROW(15, 18, 13, 13, All({ANAddAnno(d, 5, &huge), ANAddAnno(d, 5, &on6)})),
         ROW(15, 15, 15, 15, FOR(0, 12, ANAddAnno(d, uint16_t(v < 4 ? v * 8 : ~v), &point))),
-        ROW(15, 15, 15, 15, FOR(0, 13, (sized[0] = wrong[v], ANAddAnno(d, uint16_t(1 + v / 2), sized)))),
+        ROW(15, 15, 15, 15, FOR(0, 13, (desc[0] = bad[v], ANAddAnno(d, 1 + v / 2, desc)))),
         ROW(15, 18, 25, 25, All({ANNextChunkerPos(d, &r.past, &r.to), ANNextAnnoTextPos(d, &r.past,
             &r.to), Kept(ANMapRecord{ANMAPRECORD_SIZE, 1, {}, 0}, ANMapPosition, d)})),
         ROW(15, X, X, X, All({ANInitGlobalHiliteStyles(nullptr),
