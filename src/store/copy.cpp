@@ -151,6 +151,12 @@ extern "C" AN_API uint32_t ANCopyAnnos(DAHandle dest, DAHandle src) {
         ANAnnoRecord record = entry.record;
         ANRenumber(shared, count, &record.start);
         ANRenumber(shared, count, &record.end);
+        // Renumbered apart, two sibling anchors' indices ((i, 0xFFFFFFFF) and (i, 0) sort
+        // as one) can put an end before its start: the extent then closes at the start.
+        if (ANPosBefore(record.end, record.start)) {
+            const bool extent = entry.type == AN_TYPE_HILITE || entry.type == AN_TYPE_RANGE;
+            record.end = extent ? record.start : ANStepAfter(record.start);
+        }
         const bool apart =
             ANIsText(entry.type) && ANSharedAt(shared, count, entry.record.start) != nullptr;
         ANInsertEntry(target, entry.type, &record, apart ? ANINSERT_COPY_APART : ANINSERT_COPY, 0);
