@@ -1,6 +1,5 @@
-// What the fuzz target's parts share: the reader that turns the input bytes into
-// choices, the count of library calls made, failure reports, the view of a document's
-// annotation table, and the brute-force readings the answers are held against.
+// What the fuzz target's parts share: the input reader, the count of library calls, failure
+// reports, the table view, and the brute-force readings the answers are held against.
 #ifndef ANNO_FUZZ_SUPPORT_H
 #define ANNO_FUZZ_SUPPORT_H
 

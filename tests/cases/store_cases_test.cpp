@@ -356,6 +356,8 @@ TEST_F(Store, BindingMakesFindsAndDropsTheState) {
                              uint64_t(rc != 0 || option != kTop)));
     }
     Doc doc(PlainDocument(2)), bare(PlainDocument(2));
+    antk::failCall(Fn::DAGetHChunker, 1, 43);
+    EXPECT_EQ(Init(bare), 43u) << "the chunker's handle could not be had";
 #if ANNO_HAVE_PLATFORM_CONTROLS
     anwin::failAllocation(2);  // its style table: then there is none, and styles are refused
 #endif
