@@ -229,9 +229,11 @@ uint32_t ANFixText(ANClearWalk &walk, uint16_t removed) {
     ANRenumber(walk, cut);
 
     uint32_t status = kStatusOk;
-    // A later text that this clear selects is removed, and announced, in its turn;
-    // joined, its text would outlive the clear under another entry's tag.
+    // A text that this clear selects and has not yet reached (one that restoring the
+    // order moved behind its walk) is removed, and announced, in its turn: joined, the
+    // text after would go with the one before, or outlive the clear under its tag.
     if (entry.type == AN_TYPE_PLACEHOLDER && before != AN_NONE && after != AN_NONE &&
+        !ANIsSelected(ANSlot(table, before).record.tag, walk.flags, walk.value) &&
         !ANIsSelected(ANSlot(table, after).record.tag, walk.flags, walk.value)) {
         status = ANJoinTexts(walk, before, after);
     }
