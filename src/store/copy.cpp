@@ -19,6 +19,7 @@ namespace {
 struct ANSharedAnchor {
     ANPos anchor;    // itemId and subItemId name the anchor
     uint32_t units;  // the destination's units of text there before the copy
+    uint16_t last;   // the destination's last text entry there
 };
 
 bool ANIsText(uint16_t type) { return type == AN_TYPE_TEXT || type == AN_TYPE_PLACEHOLDER; }
@@ -27,19 +28,19 @@ uint32_t ANUnits(const ANEntry &entry) {
     return entry.type == AN_TYPE_TEXT ? entry.record.textLength : 1;
 }
 
-// The destination's units of text at the plain anchor of `at`; false when it has no
-// text entry there.
-bool ANTextAt(const ANEntryTable *table, const ANPos &at, uint32_t *units) {
-    bool found = false;
+// The destination's units of text at the plain anchor of `at`, and its last text entry
+// there; false when it has no text entry there.
+bool ANTextAt(const ANEntryTable *table, const ANPos &at, ANSharedAnchor *shared) {
+    uint16_t last = AN_NONE;
     uint64_t total = 0;
     for (uint16_t i = table->first; i != AN_NONE; i = ANSlot(table, i).next) {
         const ANEntry &entry = ANSlot(table, i);
         if (!ANIsText(entry.type) || !ANSameAnchor(entry.record.start, at)) continue;
-        found = true;
+        last = i;
         total += ANUnits(entry);
     }
-    *units = total > UINT32_MAX ? UINT32_MAX : static_cast<uint32_t>(total);
-    return found;
+    *shared = ANSharedAnchor{at, total > UINT32_MAX ? UINT32_MAX : uint32_t(total), last};
+    return last != AN_NONE;
 }
 
 // The anchors with text in both tables, with the destination's units there, in the
@@ -68,8 +69,7 @@ uint32_t ANFindSharedAnchors(const ANEntryTable *source, const ANEntryTable *des
         seen[1] = seen[0];
         seen[0] = at;
         ++met;
-        uint32_t units = 0;
-        if (ANTextAt(dest, at, &units)) (*shared)[(*count)++] = ANSharedAnchor{at, units};
+        if (ANTextAt(dest, at, &(*shared)[*count])) ++*count;
     }
     return AN_OK;
 }
@@ -85,12 +85,8 @@ const ANSharedAnchor *ANSharedAt(const ANSharedAnchor *shared, uint32_t count, c
 // position for the kind-5 position after its text, where ordered insertion would put
 // it: behind the entries that start before that, and the text entries that start there.
 void ANMoveLastText(ANEntryTable *table, const ANSharedAnchor &shared) {
-    uint16_t last = AN_NONE;
-    for (uint16_t i = table->first; i != AN_NONE; i = ANSlot(table, i).next) {
-        const ANEntry &entry = ANSlot(table, i);
-        if (ANIsText(entry.type) && ANSameAnchor(entry.record.start, shared.anchor)) last = i;
-    }
-    if (last == AN_NONE || ANSlot(table, last).record.start.kind == ANPOS_ANNOTEXT) return;
+    const uint16_t last = shared.last;
+    if (ANSlot(table, last).record.start.kind == ANPOS_ANNOTEXT) return;
     ANEntry &entry = ANSlot(table, last);
     const ANPos start{shared.anchor.itemId, shared.anchor.subItemId, ANPOS_ANNOTEXT, shared.units};
     uint16_t after = entry.prev;
